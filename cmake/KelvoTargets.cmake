@@ -1,0 +1,37 @@
+# How every target of the project is compiled, said once.
+
+add_library(kelvo_compile INTERFACE)
+target_compile_options(kelvo_compile INTERFACE
+  -Wall -Wextra -Wpedantic -Wconversion -Wshadow
+  $<$<BOOL:${KELVO_WERROR}>:-Werror>)
+if(KELVO_SANITIZE)
+  target_compile_options(kelvo_compile INTERFACE
+    -fsanitize=${KELVO_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
+  target_link_options(kelvo_compile INTERFACE -fsanitize=${KELVO_SANITIZE})
+endif()
+
+# A static library of the sources of one folder; its folder is its include
+# directory. Without sources it is an interface only.
+#   kelvo_library(NAME [SOURCES file...] [LIBS library...])
+function(kelvo_library name)
+  cmake_parse_arguments(arg "" "" "SOURCES;LIBS" ${ARGN})
+  if(arg_SOURCES)
+    add_library(${name} STATIC ${arg_SOURCES})
+    target_include_directories(${name} PUBLIC ${CMAKE_CURRENT_SOURCE_DIR})
+    target_link_libraries(${name} PUBLIC ${arg_LIBS} PRIVATE kelvo_compile)
+  else()
+    add_library(${name} INTERFACE)
+    target_include_directories(${name} INTERFACE ${CMAKE_CURRENT_SOURCE_DIR})
+    target_link_libraries(${name} INTERFACE ${arg_LIBS})
+  endif()
+endfunction()
+
+# A GoogleTest program whose cases are tests of their own.
+#   kelvo_test(NAME SOURCES file... [LIBS library...])
+function(kelvo_test name)
+  cmake_parse_arguments(arg "" "" "SOURCES;LIBS" ${ARGN})
+  add_executable(${name} ${arg_SOURCES})
+  target_link_libraries(${name} PRIVATE ${arg_LIBS} GTest::gmock GTest::gtest_main kelvo_compile)
+  gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
+                       PROPERTIES TIMEOUT 300)
+endfunction()

@@ -1,0 +1,49 @@
+// The step round the ring: whether the record at pCurRec may be read, whether
+// the reader has caught up with the writer, and the way to the next record.
+// Works over plain memory: a trace_file whose pHeader, pWrap and pMapEnd are
+// set is all it needs. One reader per file, no lock.
+#pragma once
+
+#include "kelvo.h"
+#include "trace_load.h"
+
+/// Offset of a record from the start of the file.
+uint32_t get_record_offset(const trace_file* pTraceFile, const trace_record_header* pRec);
+
+/// A copy of the header at `pRec`, each word read once. `pRec` must leave 28
+/// bytes before pMapEnd.
+trace_record_header read_record_header(const trace_record_header* pRec);
+
+/// The bytes of the record at `pRec` whose length field was read as `length`:
+/// cut at the end of the mapping.
+trace_bytes record_bytes(const trace_file* pTraceFile, const trace_record_header* pRec,
+                         uint32_t length);
+
+/// 1 when the record is corrupt (the warning is written), else 0. `pRec` is
+/// where it stands, `header` the copy of its header that is judged.
+int record_is_bad(const trace_record_header* pRec, const trace_record_header& header,
+                  const trace_file* pTraceFile);
+
+/// 1 when pCurRec is out of bounds or its record corrupt (the warning is
+/// written), else 0. Fills `pHeader` with the copy that was judged.
+int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_header* pHeader);
+
+/// Results of is_last_record and get_next_record.
+enum walk_result : int {
+    WALK_CORRUPT = -1, ///< give the file up; the warning is written
+    WALK_RECORD = 0,   ///< the record at pCurRec can be read
+    WALK_NO_RECORD = 1 ///< caught up with the writer, or the ring is inconsistent
+};
+
+/// Whether a record can be read at pCurRec; fills `pHeader` with the copy of
+/// its header that was judged and is to be worked on.
+walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader);
+
+/// Steps past the record at pCurRec, which is_last_record has just found
+/// readable and copied to `current`; the step goes by that copy. Returns
+/// WALK_RECORD or WALK_CORRUPT.
+walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current);
+
+/// is_last_record, then the step. On anything but WALK_RECORD no step was taken
+/// or the new position is bad.
+walk_result get_next_record(trace_file* pTraceFile);

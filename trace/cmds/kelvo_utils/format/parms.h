@@ -1,0 +1,34 @@
+// Parameters of a format: where they lie in the bytes of a record, and the text
+// they give. Main thread only; nothing is allocated.
+#pragma once
+
+#include "kelvo.h"
+#include "trace_load.h"
+
+/// Where one parameter lies. Reads go by load(), so a parameter that overruns
+/// its record reads as 0.
+struct parm_ref {
+    trace_bytes bytes;     ///< from the parameter's first byte to the end of what may be read
+    uint32_t uStringLimit; ///< a string ends here at the latest, bytes
+};
+
+/// Parameters of one format, found in a record.
+struct parm_list {
+    parm_ref pParms[MAX_PARMS];
+    int numParms; ///< those from here on are missing
+};
+
+/// Finds the parameters packed into `*pRun` and moves `*pRun` past the bytes
+/// that they took. `bAddr64`: the traced program ran in 64-bit mode.
+void bld_parm_list_packed(const format_entry* pFormatEntry, trace_bytes* pRun, int bAddr64,
+                          parm_list* pList);
+
+/// Finds the parameters in the blocks of a data record, one per block.
+/// `*pBlocks` are the bytes from the first block to the end of the record and
+/// is moved past the blocks used; `numBlocks` is the count as written.
+void bld_parm_list_unpacked(const format_entry* pFormatEntry, trace_bytes* pBlocks,
+                            uint32_t numBlocks, parm_list* pList);
+
+/// Writes the format's text with its parameters, ending with a newline.
+/// `pList` may be null when there are none.
+void format_parms(const format_entry* pFormatEntry, const parm_list* pList, int bAddr64);

@@ -1,0 +1,16 @@
+// printf-style text through the character sink. At most 4095 characters of one
+// call are kept. Main thread only, but for output_message.
+#pragma once
+
+#include <cstdarg>
+
+/// Writes the formatted text, or "kelvo error in output_vprintf()" when the
+/// format cannot be formatted.
+void output_vprintf(const char* pFormat, va_list pArgs) __attribute__((format(printf, 1, 0)));
+
+/// output_vprintf with the arguments given in place.
+void output_printf(const char* pFormat, ...) __attribute__((format(printf, 1, 2)));
+
+/// output_printf under the name that messages and summaries use. On another
+/// thread than the main one the text is handed over (see handover.h).
+void output_message(const char* pMsg, ...) __attribute__((format(printf, 1, 2)));
