@@ -9,6 +9,9 @@ if(KELVO_SANITIZE)
     -fsanitize=${KELVO_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
   target_link_options(kelvo_compile INTERFACE -fsanitize=${KELVO_SANITIZE})
 endif()
+if(KELVO_FUZZ)
+  target_compile_options(kelvo_compile INTERFACE -fsanitize=fuzzer-no-link)
+endif()
 
 # A static library of the sources of one folder; its folder is its include
 # directory. Without sources it is an interface only.
@@ -34,4 +37,14 @@ function(kelvo_test name)
   target_link_libraries(${name} PRIVATE ${arg_LIBS} GTest::gmock GTest::gtest_main kelvo_compile)
   gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
                        PROPERTIES TIMEOUT 300)
+endfunction()
+
+# A libFuzzer program; scripts/fuzz finds it by its name, which begins with
+# fuzz_, and its seed inputs in fuzz/corpus/NAME.
+#   kelvo_fuzz(NAME SOURCES file... [LIBS library...])
+function(kelvo_fuzz name)
+  cmake_parse_arguments(arg "" "" "SOURCES;LIBS" ${ARGN})
+  add_executable(${name} ${arg_SOURCES})
+  target_link_libraries(${name} PRIVATE ${arg_LIBS} kelvo_compile)
+  target_link_options(${name} PRIVATE -fsanitize=fuzzer)
 endfunction()
