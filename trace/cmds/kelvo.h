@@ -20,6 +20,7 @@
 #include <ctime>
 #include <pthread.h>
 
+struct format_index_slot;
 struct template_file;
 struct trace_file;
 
@@ -86,6 +87,11 @@ struct template_file {
     int32_t lineNumber;      ///< line ends read so far
     format_entry* pFormats;  ///< newest first
     char preload_path[4096]; ///< empty for a template loaded on demand
+
+    // Not part of the format of the record, but kept beside it:
+    format_index_slot* pIndex;   ///< pFormats by ids; null for a small template
+    size_t uIndexSize;           ///< slots of pIndex
+    template_file* pNextInChain; ///< on-demand templates whose ids hash alike
 };
 
 // -------------------------------------------------------------- trace files
@@ -105,6 +111,7 @@ struct thread_info {
 };
 
 struct trace_queue_element;
+struct file_run;
 
 /// One trace file of the run. Made in one block with its path, all zero but fd.
 ///
@@ -150,8 +157,14 @@ struct trace_file {
     // Not part of the format of the record, but kept beside it:
     uint8_t uPlatform;        ///< the writer's platform code, taken at open
     int bAccepted;            ///< the header was validated: the two reader words may be stored
+    size_t uMappedSize;       ///< bytes mapped at pHeader; uSize is its low 32 bits
     uint64_t uUncountedBytes; ///< bytes walked since a record last counted in the sequence
     int bTimeBaseInQueue;     ///< a record that changes timeInfo is queued and not yet formatted
+    file_run* pQueuedRun;     ///< this file's records in the output queue; made by the queue
+    pthread_cond_t roomCond;  ///< signalled when the reader may push again
+    int bWaitsForRoom;        ///< the reader waits on roomCond
+    uint32_t uRoomAt;         ///< it is to be woken at this numRecPushed
+    int bRunning;             ///< the reader was started and has not finished
 };
 
 /// trace_file::startOptions.
@@ -210,6 +223,11 @@ struct TrcFmtngProcCtrl {
         uNextUnOpenFileIdx;         ///< list elements started or tried; written under the mutex
     uint32_t uTrcPreProcHdrListLen; ///< elements allocated
     TrcPreProcHdrElem* pTrcPreProcHdrList; ///< outside follow mode only
+
+    // Kept beside, under the mutex:
+    uint32_t uRunningFiles;           ///< files whose reader was started and has not finished
+    uint32_t uFilesWithNothingQueued; ///< those of them that have no record in the queue
+    uint32_t uFinishedFiles;          ///< files whose reader has finished or could not start
 };
 
 // ------------------------------------------------------------------ globals

@@ -22,6 +22,8 @@ static_assert(sizeof(cu_timeinfo) == 16);
 
 /// Signed 128-bit nanoseconds: no sum of a base and a raw stamp can wrap.
 __extension__ typedef __int128 cu_nanoseconds;
+inline constexpr cu_nanoseconds CU_NANOSECONDS_MAX =
+    (static_cast<cu_nanoseconds>(INT64_MAX) << 64) | static_cast<cu_nanoseconds>(UINT64_MAX);
 
 /// Exact time of the raw stamp `timeStamp` under `base`, in nanoseconds since
 /// the epoch (negative before it). Rises with `timeStamp` for a fixed base.

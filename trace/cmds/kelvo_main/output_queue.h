@@ -1,0 +1,91 @@
+// The output queue: the records that wait to be printed, earliest first.
+//
+// Records of one file nearly always arrive in time order, so each file has a
+// first-in first-out run of its own, and a small heap over the heads of the
+// runs gives the earliest record. A record that is earlier than the last one of
+// its file's run goes to a second heap, for latecomers. The earliest record of
+// the queue is thus the earlier of the two heaps' tops, whatever the files hold,
+// and the usual push and pop look at no more than a few entries.
+//
+// Entries hold what is compared, so that ordering never touches the records.
+// Times are not cached: they follow from the raw stamp and the time base in
+// force. When a file's time base changes, time_base_changed puts both heaps in
+// order again (a run stays in order: all of it moves by the same amount).
+//
+// Everything here is called with priorityQmutex held.
+#pragma once
+
+#include "kelvo.h"
+
+#include <cstddef>
+#include <cstdint>
+
+/// What the order of a queued record is made of.
+struct queue_entry {
+    uint64_t uTimeStamp;          ///< raw
+    uint64_t pushSeqn;            ///< breaks ties
+    const cu_timeinfo* pTimeInfo; ///< time base; null: a start record, which carries its own
+    trace_queue_element* pElement;
+};
+
+/// The entry of an element whose pFile, pushSeqn and record are filled in.
+queue_entry make_queue_entry(const trace_queue_element* pElement);
+
+/// Negative when the first comes first, positive when the second does, 0 only
+/// for the same entry.
+int cmp_queue_entries(const queue_entry& first, const queue_entry& second);
+
+/// Time of a record under the time bases in force, nanoseconds since the epoch.
+cu_nanoseconds queue_entry_time(const queue_entry& entry);
+
+/// A growable array of entries, used as a ring or as a heap.
+struct queue_entries {
+    queue_entry* pEntries = nullptr;
+    size_t uCapacity = 0; ///< a power of two, or 0
+    size_t uFirst = 0;    ///< of a ring: index of its head
+    size_t uSize = 0;
+
+    /// Makes room for one more entry. Returns false when memory ran out.
+    bool reserve_one();
+    /// Of a ring: the entry at `uIndex` counted from the head.
+    queue_entry& at(size_t uIndex) {
+        return pEntries[(uFirst + uIndex) & (uCapacity - 1)];
+    }
+    void release();
+};
+
+/// The run of one file, made at its first push and kept by the queue.
+struct file_run {
+    file_run* pNext;
+    trace_file* pFile;
+    queue_entries ring;
+};
+
+/// The queue; TrcOutput_Q is the only instance outside tests.
+class output_queue {
+public:
+    /// Adds an element (pFile, pushSeqn and record filled in). Returns false
+    /// when memory ran out; the element then stays the caller's.
+    bool push(trace_queue_element* pElement);
+
+    /// Takes the earliest element out, or null when the queue is empty. The
+    /// caller owns it from then on.
+    trace_queue_element* pop();
+
+    bool empty() const {
+        return m_heads.uSize == 0 && m_late.uSize == 0;
+    }
+
+    /// Restores the order after the time base of a file was replaced.
+    void time_base_changed();
+
+    /// Releases the queue's own memory; the elements are not touched.
+    void release();
+
+private:
+    queue_entries m_heads; ///< heap: the first entry of every run that is not empty
+    queue_entries m_late;  ///< heap: latecomers
+    file_run* m_pRuns = nullptr;
+};
+
+extern output_queue TrcOutput_Q;

@@ -1,0 +1,280 @@
+#include "reader.h"
+
+#include "first_record.h"
+#include "insufficient.h"
+#include "merge.h"
+#include "mutex.h"
+#include "open.h"
+#include "output_queue.h"
+#include "pool.h"
+#include "progress.h"
+#include "start.h"
+#include "walk.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <unistd.h>
+
+namespace {
+
+TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;
+
+constexpr int64_t FULL_QUEUE_WAIT_NS = 500'000;
+constexpr int64_t HELD_BACK_WAIT_NS = 10'000'000; // woken earlier when the room is there
+constexpr useconds_t FOLLOW_WAIT_US = 100'000;
+
+/// More files than this at once do not make a file's share of the cap smaller.
+constexpr uint32_t MAX_SHARES = 64;
+
+/// Copies of records that are not yet pushed.
+struct record_batch {
+    std::array<trace_queue_element*, 256> pElements;
+    size_t uCount = 0;
+};
+
+/// Diagnostic line of the low-memory mode.
+void say(const char* pWhat, const trace_file* pTraceFile) {
+    if (memory_is_restricted)
+        fprintf(stderr, "%s: %s\n", pWhat, pTraceFile->pName);
+}
+
+// ------------------------------------------------------------- room to push
+
+/// This file's part of the cap.
+uint32_t share_of_queue() {
+    const uint32_t uUnfinished = static_cast<uint32_t>(anchor.iNumberFiles) - ctrl.uFinishedFiles;
+    return MAX_QUEUED / std::clamp(uUnfinished, 1U, MAX_SHARES);
+}
+
+bool queue_is_full_for(const trace_file* pTraceFile) {
+    return ctrl.queueDepth >= MAX_QUEUED && pTraceFile->numRecPushed > ALWAYS_QUEUED;
+}
+
+/// Waits at most `iNanoseconds`, or until the file has at most `uRoomAt` records
+/// queued or its time base was replaced.
+void wait_on_room(trace_file* pTraceFile, uint32_t uRoomAt, int64_t iNanoseconds) {
+    timespec until;
+    clock_gettime(CLOCK_MONOTONIC, &until);
+    until.tv_nsec += iNanoseconds;
+    until.tv_sec += until.tv_nsec / 1'000'000'000;
+    until.tv_nsec %= 1'000'000'000;
+    pTraceFile->uRoomAt = uRoomAt;
+    pTraceFile->bWaitsForRoom = 1;
+    pthread_cond_clockwait(&pTraceFile->roomCond, &ctrl.priorityQmutex, CLOCK_MONOTONIC, &until);
+    pTraceFile->bWaitsForRoom = 0;
+}
+
+/// Called with priorityQmutex held, which it gives up while it waits.
+void wait_for_room(trace_file* pTraceFile) {
+    if (pTraceFile->numRecPushed >= share_of_queue())
+        while (pTraceFile->numRecPushed > share_of_queue() / 2)
+            wait_on_room(pTraceFile, share_of_queue() / 2, HELD_BACK_WAIT_NS);
+    while (pTraceFile->bTimeBaseInQueue)
+        wait_on_room(pTraceFile, 0, HELD_BACK_WAIT_NS);
+    while (queue_is_full_for(pTraceFile))
+        wait_on_room(pTraceFile, ALWAYS_QUEUED, FULL_QUEUE_WAIT_NS);
+}
+
+// ------------------------------------------------------------------ pushing
+
+/// Pushes one element. Returns false when memory ran out.
+bool push_element(trace_file* pTraceFile, trace_queue_element* pElement) {
+    wait_for_room(pTraceFile);
+    pElement->pushSeqn = ctrl.PushSeqn;
+    if (!anchor.bFollow)
+        TrcFileProcessingCtrl(pElement, pTraceFile->index2 + 1);
+    if (!TrcOutput_Q.push(pElement))
+        return false;
+    if (pElement->header.function == TRC_FUNC_START ||
+        pElement->header.function == TRC_FUNC_TIME_CALIBRATION)
+        pTraceFile->bTimeBaseInQueue = 1;
+    if (pTraceFile->numRecPushed++ == 0)
+        --ctrl.uFilesWithNothingQueued;
+    ++ctrl.PushSeqn;
+    ++ctrl.queueDepth;
+    return true;
+}
+
+/// Pushes what the batch holds. Returns 0, or -1 when memory ran out (reported;
+/// the elements from there on are lost).
+int push_batch(trace_file* pTraceFile, record_batch& batch) {
+    size_t uPushed = 0;
+    {
+        const mutex_guard guard(ctrl.priorityQmutex);
+        while (uPushed < batch.uCount && push_element(pTraceFile, batch.pElements[uPushed]))
+            ++uPushed;
+    }
+    const bool bFailed = uPushed < batch.uCount;
+    if (bFailed)
+        warn_insufficient_resources(pTraceFile->pName, batch.pElements[uPushed]->length);
+    for (; uPushed < batch.uCount; ++uPushed)
+        free(batch.pElements[uPushed]);
+    batch.uCount = 0;
+    return bFailed ? -1 : 0;
+}
+
+/// Copies the record at pCurRec, whose header was judged as `header`. The copy
+/// frees the record in the mapping, which the writer may overwrite. A record
+/// that ends beyond the mapping is copied as far as it is there. Null when
+/// memory ran out (reported).
+trace_queue_element* copy_record(trace_file* pTraceFile, const trace_record_header& header) {
+    const trace_bytes record = record_bytes(pTraceFile, pTraceFile->pCurRec, header.length);
+    const size_t uSize = record.size() + QUEUE_ELEMENT_OVERHEAD;
+    auto* const pElement = static_cast<trace_queue_element*>(malloc(uSize));
+    if (pElement == nullptr) {
+        warn_insufficient_resources(pTraceFile->pName, static_cast<int64_t>(uSize));
+        return nullptr;
+    }
+    constexpr size_t HEAD = offsetof(trace_queue_element, header);
+    auto* const pBytes = reinterpret_cast<std::byte*>(pElement);
+    memset(pBytes, 0, HEAD);
+    memcpy(pBytes + HEAD, record.data(), record.size());
+    memset(pBytes + HEAD + record.size(), 0, uSize - HEAD - record.size());
+    pElement->header = header;
+    pElement->header.length = static_cast<uint32_t>(record.size());
+    pElement->pFile = pTraceFile;
+    pElement->offset = get_record_offset(pTraceFile, pTraceFile->pCurRec);
+    pElement->length = static_cast<uint32_t>(uSize);
+    return pElement;
+}
+
+/// Queues the record at pCurRec. Returns 0, or -1 when memory ran out.
+int queue_record_for_formating(trace_file* pTraceFile, const trace_record_header& header,
+                               record_batch& batch) {
+    if (batch.uCount == batch.pElements.size() && push_batch(pTraceFile, batch) != 0)
+        return -1;
+    trace_queue_element* const pElement = copy_record(pTraceFile, header);
+    if (pElement == nullptr)
+        return -1;
+    batch.pElements[batch.uCount++] = pElement;
+    return 0;
+}
+
+// ------------------------------------------------------------------ reading
+
+/// Kinds that are handed on for output; the others are only stepped over.
+bool is_for_output(const trace_record_header& header) {
+    return header.function >= TRC_FUNC_ID && header.function <= TRC_FUNC_TIME_CALIBRATION;
+}
+
+/// Makes the handshake and stands on the first record. Returns 0, or -1 when
+/// the file is corrupt.
+int begin_reading(trace_file* pTraceFile) {
+    request_tail(pTraceFile);
+    int iResult = find_first_record(pTraceFile);
+    if (iResult == 0)
+        iResult = set_file_start(pTraceFile);
+    release_tail(pTraceFile);
+    pTraceFile->recordNumber = 0;
+    return iResult;
+}
+
+void read_records(trace_file* pTraceFile, record_batch& batch) {
+    while (!pTraceFile->bDone) {
+        trace_record_header header;
+        const walk_result here = is_last_record(pTraceFile, &header);
+        if (here == WALK_CORRUPT)
+            return;
+        if (here == WALK_NO_RECORD) {
+            if (!anchor.bFollow || push_batch(pTraceFile, batch) != 0)
+                return;
+            usleep(FOLLOW_WAIT_US);
+            continue;
+        }
+        if (is_for_output(header) && start_is_reached(pTraceFile, header) &&
+            queue_record_for_formating(pTraceFile, header, batch) != 0)
+            return;
+        if (step_to_next_record(pTraceFile, header) == WALK_CORRUPT)
+            return;
+    }
+}
+
+/// Waits until none of the file's records is queued or being formatted: until
+/// then the main thread works with what closing the file releases.
+void wait_until_drained(const trace_file* pTraceFile) {
+    while (pTraceFile->numRecPushed != 0 || pTraceFile->bRecUnderProcess)
+        pthread_cond_wait(&ctrl.priorityQcond, &ctrl.priorityQmutex);
+}
+
+void end_reading(trace_file* pTraceFile) {
+    {
+        const mutex_guard guard(ctrl.priorityQmutex);
+        if (!anchor.bFollow)
+            TrcFileProcessingCtrl(nullptr, pTraceFile->index2 + 1);
+        wait_until_drained(pTraceFile);
+        if (!anchor.bFollow)
+            kelvo_progress_status();
+    }
+    close_trace_file(pTraceFile, 0);
+    say("Closed", pTraceFile);
+    const mutex_guard guard(ctrl.priorityQmutex);
+    file_stops_running(pTraceFile);
+    pTraceFile->bDone = 1;
+}
+
+/// Whether the reader of the list element must run before the record is pushed.
+bool its_time_has_come(const TrcPreProcHdrElem& candidate, const trace_queue_element* pElement) {
+    return pElement == nullptr || pElement->header.timeStamp >= candidate.header.timeStamp ||
+           queue_entry_time(make_queue_entry(pElement)) >= candidate.earliestFrom;
+}
+
+} // namespace
+
+int start_tracefile_processing(trace_file* pTraceFile) {
+    say("Starting", pTraceFile);
+    if (!anchor.bFollow) {
+        free(pTraceFile->pHeader);
+        pTraceFile->pHeader = nullptr;
+    }
+    pthread_cond_init(&pTraceFile->roomCond, nullptr);
+    if (anchor.bFollow || open_lock_map_trace_file(pTraceFile) == 0) {
+        file_starts_running(pTraceFile);
+        if (poolAddNewTask(&pTraceFile->threadId, pTraceFile) == 0) {
+            say("Queued", pTraceFile);
+            return 0;
+        }
+        file_stops_running(pTraceFile);
+        warn_insufficient_resources_during_open(pTraceFile->pName, pTraceFile->uSize);
+    }
+    close_trace_file(pTraceFile, 0);
+    return -1;
+}
+
+void TrcFileProcessingCtrl(const trace_queue_element* pElement, uint32_t next) {
+    if (anchor.bFollow)
+        return;
+    const uint32_t uFiles = static_cast<uint32_t>(anchor.iNumberFiles);
+    while (next < uFiles && ctrl.uNextUnOpenFileIdx < uFiles) {
+        TrcPreProcHdrElem& candidate = ctrl.pTrcPreProcHdrList[next];
+        if (candidate.isOpenned)
+            return;
+        if (candidate.pTrcFile->bErrorProcessing) {
+            ++next;
+            continue;
+        }
+        if (!its_time_has_come(candidate, pElement))
+            return;
+        candidate.isOpenned = 1;
+        const bool bStarted = start_tracefile_processing(candidate.pTrcFile) == 0;
+        ++ctrl.uNextUnOpenFileIdx;
+        if (bStarted)
+            return;
+        candidate.isOpenned = 0;
+        candidate.pTrcFile->bErrorProcessing = 1;
+    }
+}
+
+void* thread_main(void* pTask) {
+    auto* const pTraceFile = static_cast<trace_file*>(pTask);
+    say("Processing", pTraceFile);
+    if (begin_reading(pTraceFile) == 0) {
+        record_batch batch;
+        read_records(pTraceFile, batch);
+        push_batch(pTraceFile, batch);
+    }
+    end_reading(pTraceFile);
+    return nullptr;
+}
