@@ -1,9 +1,15 @@
 // Signals of the run. Terminating signals end it with status 0 through the jump
-// point anchor.sigbuf; fault signals end it through their previous disposition.
+// point anchor.sigbuf; fault signals end the process through their previous
+// disposition.
 //
 // A terminating signal never interrupts the allocator or the output stream: the
 // handler jumps only while the main thread waits (main_thread_sleep), otherwise
-// it leaves a note that take_pending_signal acts on.
+// it leaves a note that take_pending_signal acts on. Other threads send their
+// signals on to the main thread.
+//
+// anchor.threadId and anchor.sigbuf are set before the handlers are installed,
+// and the function that set anchor.sigbuf must not have returned when one of
+// the functions here jumps.
 #pragma once
 
 #include <csignal>
@@ -15,15 +21,19 @@ void sighandler(int signo, siginfo_t* pInfo, void* pContext);
 /// Installs sighandler and keeps the previous dispositions of the fault signals.
 void install_signal_handlers();
 
-/// Blocks (`how` SIG_BLOCK) or unblocks every signal but SIGTRAP and SIGABRT in
-/// the main thread. Returns 0, or -1 after message 2625-150.
+/// Blocks (`how` SIG_BLOCK) or unblocks (SIG_UNBLOCK) every signal but SIGTRAP
+/// and SIGABRT in the calling thread. Returns 0, or -1 after message 2625-150.
 int change_signal_mask(int how);
 
-/// Jumps to anchor.sigbuf when a terminating signal has arrived. Main thread,
-/// outside allocator and stream.
+/// The terminating signal that has arrived and was not acted on, or 0.
+int pending_signal();
+
+/// Jumps to anchor.sigbuf when a terminating signal has arrived; bReadersMayRun
+/// is then set. Main thread, outside allocator and stream, no mutex held.
 void take_pending_signal();
 
-/// Sleeps at most `microseconds`, ended at once by a terminating signal. In
-/// follow mode also watches standard output: when the reader of its pipe has
-/// gone the run ends as by SIGPIPE. Main thread, no mutex held.
+/// Sleeps at most `microseconds`, ended at once by a terminating signal, as
+/// take_pending_signal. In follow mode also watches standard output: when the
+/// reader of its pipe has gone the run ends as by SIGPIPE. Main thread, no mutex
+/// held.
 void main_thread_sleep(int64_t microseconds);

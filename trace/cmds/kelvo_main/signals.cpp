@@ -1,0 +1,159 @@
+// How a note and a jump share the work. `bMainThreadWaits` is raised before the
+// last look at the note and lowered after the wait, so a signal either comes
+// before the look, which then finds its note, or later, and its handler jumps.
+// In between the main thread is in system calls alone, nothing is half done.
+//
+// How a fault on a reader thread ends the process. The reader's handler sends
+// the signal to the main thread and returns into the same fault, again and
+// again. The main thread can take the signal anywhere, also inside a blocked
+// write or a mutex; its handler installs the previous disposition, under which
+// the next fault ends the process. The handlers need no lock and no memory.
+#include "signals.h"
+
+#include "cleanup.h"
+#include "kelvo.h"
+#include "messages.h"
+
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
+#include <iterator>
+#include <poll.h>
+#include <unistd.h>
+
+namespace {
+
+constexpr int FAULT_SIGNALS[] = {SIGILL, SIGBUS, SIGFPE, SIGSEGV};
+constexpr int TERMINATING_SIGNALS[] = {SIGINT, SIGQUIT, SIGTSTP, SIGTTIN, SIGTTOU, SIGPIPE};
+
+/// How often a reader passes its fault on, a millisecond apart, before it ends
+/// the process itself: the main thread, on its way out with all signals blocked,
+/// may be waiting for a pipe.
+constexpr int MOST_FORWARDED_FAULTS = 500;
+
+std::atomic<int> iPendingSignal{0};
+std::atomic<bool> bMainThreadWaits{false};
+std::atomic<int> iForwardedFaults{0};
+static_assert(std::atomic<int>::is_always_lock_free && std::atomic<bool>::is_always_lock_free,
+              "used in signal handlers");
+
+bool on_main_thread() {
+    return pthread_equal(pthread_self(), anchor.threadId) != 0;
+}
+
+[[noreturn]] void jump_to_end(int signo) {
+    bMainThreadWaits = false;
+    iPendingSignal = 0;
+    bReadersMayRun = true;
+    siglongjmp(anchor.sigbuf, signo);
+}
+
+void handle_terminating_signal(int signo) {
+    if (!on_main_thread()) {
+        pthread_kill(anchor.threadId, signo);
+        return;
+    }
+    if (bMainThreadWaits)
+        jump_to_end(signo);
+    iPendingSignal = signo;
+    // The write that SIGTTOU interrupted is repeated, and would only raise it
+    // again; ignored, the signal lets the write pass.
+    if (signo == SIGTTOU)
+        signal(SIGTTOU, SIG_IGN);
+}
+
+/// Lets the signal have the effect that it had before the run: a fault recurs
+/// when the handler returns; a signal that was sent would not, and is repeated.
+void restore_disposition(int signo, const siginfo_t* pInfo) {
+    sigaction(signo, &anchor.origAction[signo], nullptr);
+    if (pInfo->si_code <= 0)
+        raise(signo);
+}
+
+void end_this_reader() {
+    const pthread_t self = pthread_self();
+    for (trace_file* pFile = anchor.pFirstFile; pFile != nullptr; pFile = pFile->pNext) {
+        if (pFile->threadId == self) {
+            pFile->bDone = 1;
+            return;
+        }
+    }
+}
+
+void handle_fault(int signo, const siginfo_t* pInfo) {
+    if (on_main_thread()) {
+        cleanup(1);
+        restore_disposition(signo, pInfo);
+        return;
+    }
+    end_this_reader();
+    if (++iForwardedFaults > MOST_FORWARDED_FAULTS) {
+        restore_disposition(signo, pInfo);
+        return;
+    }
+    pthread_kill(anchor.threadId, signo);
+    poll(nullptr, 0, 1);
+}
+
+} // namespace
+
+void sighandler(int signo, siginfo_t* pInfo, void*) {
+    const int savedErrno = errno;
+    if (std::find(std::begin(FAULT_SIGNALS), std::end(FAULT_SIGNALS), signo) !=
+        std::end(FAULT_SIGNALS))
+        handle_fault(signo, pInfo);
+    else
+        handle_terminating_signal(signo);
+    errno = savedErrno;
+}
+
+void install_signal_handlers() {
+    struct sigaction action {};
+    action.sa_sigaction = sighandler;
+    action.sa_flags = SA_SIGINFO;
+    sigemptyset(&action.sa_mask);
+    for (const int signo : FAULT_SIGNALS)
+        sigaction(signo, &action, &anchor.origAction[signo]);
+    for (const int signo : TERMINATING_SIGNALS)
+        sigaction(signo, &action, nullptr);
+}
+
+int change_signal_mask(int how) {
+    sigset_t set;
+    sigfillset(&set);
+    sigdelset(&set, SIGTRAP);
+    sigdelset(&set, SIGABRT);
+    const int error = pthread_sigmask(how, &set, nullptr);
+    if (error == 0)
+        return 0;
+    output_sys_message("%s: 2625-150 Error from sigthreadmask(), ", error, anchor.pProgName);
+    return -1;
+}
+
+int pending_signal() {
+    return iPendingSignal;
+}
+
+void take_pending_signal() {
+    if (const int signo = iPendingSignal; signo != 0)
+        jump_to_end(signo);
+}
+
+void main_thread_sleep(int64_t microseconds) {
+    // A descriptor that is not open would end every sleep at once.
+    static bool bOutputIsOpen = true;
+
+    const timespec duration{static_cast<time_t>(microseconds / 1000000),
+                            static_cast<long>(microseconds % 1000000) * 1000};
+    const bool bWatchOutput = anchor.bFollow && bOutputIsOpen;
+    pollfd output{STDOUT_FILENO, 0, 0};
+    bMainThreadWaits = true;
+    take_pending_signal();
+    const int iReady = ppoll(&output, bWatchOutput ? 1 : 0, &duration, nullptr);
+    bMainThreadWaits = false;
+    if (iReady <= 0)
+        return;
+    if (output.revents & (POLLERR | POLLHUP))
+        jump_to_end(SIGPIPE);
+    bOutputIsOpen = false;
+}
