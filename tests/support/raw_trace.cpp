@@ -1,0 +1,106 @@
+#include "raw_trace.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+#include <memory>
+
+namespace {
+
+struct close_file {
+    void operator()(FILE* pFile) const {
+        fclose(pFile);
+    }
+};
+using file_handle = std::unique_ptr<FILE, close_file>;
+
+} // namespace
+
+std::vector<std::byte> raw_record_bytes(const raw_record& record) {
+    trace_record_header header{};
+    header.length = static_cast<uint32_t>(
+        record.length < 0 ? static_cast<int64_t>(sizeof(header) + record.body.size())
+                          : record.length);
+    header.function = record.function;
+    header.reserved = record.reserved;
+    header.seqNumber = record.seqNumber;
+    memcpy(header.compId, record.compId.data(),
+           std::min(record.compId.size(), sizeof(header.compId)));
+    header.threadId = record.threadId;
+    header.timeStamp = record.timeStamp;
+    std::vector<std::byte> bytes = raw_bytes(header);
+    bytes.insert(bytes.end(), record.body.begin(), record.body.end());
+    return bytes;
+}
+
+raw_trace::raw_trace(uint32_t uSize) : content(uSize) {
+    header.uProperties = TRC_PROP_LITTLE_ENDIAN | TRC_PROP_ADDR_64;
+    header.uPlatform = 2;
+    header.uVersion = TRC_MAX_VERSION;
+    header.uFlags = TRC_FLAG_TAIL_ACK;
+    header.uOffset = sizeof(trace_file_header);
+    header.uSeqLock = TRC_SEQ_NO_READER;
+    header.uActualFileSize = uSize;
+    header.uOldestRecordOffset = header.uOffset;
+    header.tz_offset = TRC_TZ_NOT_RECORDED;
+}
+
+raw_trace& raw_trace::put(uint32_t uAt, trace_bytes bytes) {
+    if (uAt < content.size())
+        std::copy_n(bytes.begin(), std::min(bytes.size(), content.size() - uAt),
+                    content.begin() + uAt);
+    return *this;
+}
+
+raw_trace& raw_trace::put(uint32_t uAt, const raw_record& record) {
+    const std::vector<std::byte> bytes = raw_record_bytes(record);
+    uEnd = uAt + static_cast<uint32_t>(bytes.size());
+    return put(uAt, bytes);
+}
+
+uint32_t raw_trace::add(const raw_record& record) {
+    const uint32_t uAt = end();
+    put(uAt, record);
+    return uAt;
+}
+
+uint32_t raw_trace::add_filler(uint32_t uLength, uint32_t seqNumber) {
+    raw_record filler{.function = TRC_FUNC_FILLER, .seqNumber = seqNumber};
+    filler.body.resize(uLength > sizeof(trace_record_header) ? uLength - sizeof(trace_record_header)
+                                                             : 0);
+    filler.length = uLength;
+    return add(filler);
+}
+
+uint32_t raw_trace::add_rest() {
+    return add_filler(static_cast<uint32_t>(content.size()) - end());
+}
+
+std::vector<std::byte> raw_trace::bytes() const {
+    std::vector<std::byte> result = content;
+    const size_t uSize = std::min<size_t>({sizeof(header), uHeaderBytes, result.size()});
+    std::copy_n(std::as_bytes(std::span(&header, 1)).begin(), uSize, result.begin());
+    return result;
+}
+
+bool raw_trace::write(const std::string& path) const {
+    return write_file(path, bytes());
+}
+
+bool write_file(const std::string& path, trace_bytes bytes) {
+    file_handle pFile(fopen(path.c_str(), "wbe"));
+    if (pFile == nullptr)
+        return false;
+    const bool bWritten = bytes.empty() || fwrite(bytes.data(), bytes.size(), 1, pFile.get()) == 1;
+    return fclose(pFile.release()) == 0 && bWritten;
+}
+
+std::vector<std::byte> read_file(const std::string& path) {
+    std::vector<std::byte> bytes;
+    const file_handle pFile(fopen(path.c_str(), "rbe"));
+    std::byte buffer[65536];
+    size_t uRead = 0;
+    while (pFile != nullptr && (uRead = fread(buffer, 1, sizeof(buffer), pFile.get())) > 0)
+        bytes.insert(bytes.end(), buffer, buffer + uRead);
+    return bytes;
+}
