@@ -1,0 +1,79 @@
+// Data records: a trace id and blocks of bytes. The format of the record takes
+// its parameters from the leading blocks, one each; every further block has a
+// format of its own, named by its position, or is dumped.
+
+#include "hex.h"
+#include "parms.h"
+#include "record_bodies.h"
+#include "record_text.h"
+
+/// Takes the first block off `*pBlocks` and stores its data. Returns false when
+/// no block is left. A block whose length is negative or leads beyond the end
+/// is the last one and is cut.
+static bool take_block(trace_bytes* pBlocks, trace_bytes* pData) {
+    if (!lies_inside(*pBlocks, 0, sizeof(trace_data)))
+        return false;
+    // A negative length, taken as unsigned, is beyond any end.
+    const size_t uLength = load<uint32_t>(*pBlocks, 0);
+    *pData = load_run(*pBlocks, sizeof(trace_data), uLength);
+    const size_t uUsed = sizeof(trace_data) + pData->size();
+    *pBlocks = load_run(*pBlocks, (uUsed + 3) / 4 * 4);
+    return true;
+}
+
+/// Writes the format of the record, or its form without one, and moves
+/// `*pBlocks` past the blocks used. Returns their number.
+static uint32_t write_leading_blocks(const record_view& record, const format_entry* pFormat,
+                                     uint32_t uBlocks, trace_bytes* pBlocks) {
+    static constinit parm_list parms{}; // static: see format_data_block
+    if (!pFormat) {
+        record_text().add("id=").add_hex(record.uTraceId, 8).add("\n").write();
+        return 0;
+    }
+    if (pFormat->numParms == 0) {
+        format_parms(pFormat, nullptr, record.pFile->addrMode64);
+        return 0;
+    }
+    bld_parm_list_unpacked(pFormat, pBlocks, uBlocks, &parms);
+    format_parms(pFormat, &parms, record.pFile->addrMode64);
+    return static_cast<uint32_t>(parms.numParms);
+}
+
+int format_data_record(const record_view& record) {
+    int insufficient_resources;
+    const format_entry* pFormat =
+        find_record_format(record, record.uTraceId, -1, &insufficient_resources);
+    if (insufficient_resources)
+        return 1;
+
+    const auto uBlocks = load<uint32_t>(record.bytes, offsetof(trace_record_data, n_blocks));
+    trace_bytes blocks = load_run(record.bytes, sizeof(trace_record_data));
+    const uint32_t uFirstFree = write_leading_blocks(record, pFormat, uBlocks, &blocks);
+    if (anchor.bBrief)
+        return 0;
+
+    trace_bytes data;
+    for (uint32_t i = uFirstFree; i < uBlocks && take_block(&blocks, &data); i++) {
+        pFormat = find_record_format(record, record.uTraceId, static_cast<int>(i),
+                                     &insufficient_resources);
+        if (insufficient_resources)
+            return 1;
+        if (pFormat) {
+            format_data_block(pFormat, data, record.pFile->addrMode64);
+        } else {
+            record_text()
+                .add("----------------- Data Block ")
+                .add_decimal(i)
+                .add(" ----------------")
+                .write();
+            format_hex(data);
+        }
+    }
+    return 0;
+}
+
+void write_data(const record_view& record, const format_entry*) {
+    // What was written of the record stands; it is not one that memory was too
+    // short to format.
+    (void)format_data_record(record);
+}
