@@ -1,5 +1,9 @@
 // Opening, locking, validating, mapping and closing trace files. The only code
 // that calls mmap.
+//
+// A file is made by open_trace_file and, outside follow mode, parked at once;
+// open_lock_map_trace_file brings it back when its turn to be read comes, and
+// close_trace_file ends it. The record stays until release_trace_file.
 #pragma once
 
 #include "kelvo.h"
@@ -7,26 +11,36 @@
 /// Opens one file argument: prints its header summary, applies the first file's
 /// time zone and start argument, and hands the new record out. Outside follow
 /// mode the file comes back parked: unmapped, unlocked, closed, with a private
-/// copy of its header in pHeader. Main thread.
+/// copy of its header in pHeader (a malloc block). Main thread.
 ///
-/// `pElem` receives the header of the first record of the record area and the
-/// converted time of the oldest record (bOldestKnown, oldestTime); its other
-/// fields are the caller's. `total_files` is the number of file arguments, `fileIndex` this one's
-/// position. With `bPrBaseProgName` only the base program name is printed.
+/// `pElem` receives the header of the first record of the record area and,
+/// outside follow mode, the converted time of the oldest record (bOldestKnown,
+/// oldestTime); its other fields are the caller's. `total_files` is the number
+/// of file arguments, `fileIndex` this one's position. With `bPrBaseProgName`
+/// only the base program name is printed, the file is closed again untouched,
+/// and the record handed out is null.
 /// Returns 0, or -1 after a message (with -B perhaps without one); then nothing
 /// is handed out and nothing stays open.
 int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrElem* pElem,
                     int bPrBaseProgName, unsigned int total_files, unsigned int fileIndex);
 
 /// Opens, locks (unless -z) and maps the file: fd, uSize, pHeader, pMapEnd and
-/// pWrap. Returns 0, or -1 after a message; the descriptor then stays in fd for
-/// close_trace_file. Any thread.
+/// pWrap, all taken afresh; the header is not validated, so pWrap may lie
+/// anywhere. A parked header copy is released first. Returns 0, or -1 after a
+/// message; the descriptor then stays in fd for close_trace_file, and nothing
+/// is mapped. Never waits, whatever kind of file the path names. Any thread.
 int open_lock_map_trace_file(trace_file* pTraceFile);
 
-/// Releases mapping, descriptor, lock and per-file lists; lowers uTailReq, ends
-/// uSeqLock and sets the file's times. The record itself stays. With
-/// `bSigActive` memory is left alone.
+/// Releases mapping (or parked header copy), descriptor, lock and per-file
+/// lists; lowers uTailReq and ends uSeqLock in a file that was accepted, and
+/// sets the file's times when modTime holds one. The record itself stays. With
+/// `bSigActive` memory is left alone. May be called again. Any thread; nobody
+/// else may be using the file.
 void close_trace_file(trace_file* pTraceFile, int bSigActive);
 
-/// Sets TZ from anchor.tz_offset.
+/// Releases a closed or parked record that is in no list. Null is allowed.
+void release_trace_file(trace_file* pTraceFile);
+
+/// Sets TZ from anchor.tz_offset, for all later local-time conversions of the
+/// process. Main thread, while no other thread converts times.
 void set_tz();

@@ -1,5 +1,10 @@
 // Where output begins: the -s argument, its conversion for one file, and the
 // test that each record passes until the start is reached.
+//
+// Start times are kept in signed 32-bit seconds. A time that does not fit is
+// kept as the nearest that does: a start after January 2038 begins there, one
+// before December 1901 begins with the first record. Record numbers are kept
+// the same way.
 #pragma once
 
 #include "kelvo.h"

@@ -1,10 +1,16 @@
 // The step round the ring: whether the record at pCurRec may be read, whether
 // the reader has caught up with the writer, and the way to the next record.
-// Works over plain memory: a trace_file whose pHeader, pWrap and pMapEnd are
-// set is all it needs. One reader per file, no lock.
+// Works over plain memory: a trace_file whose pName, pHeader, pWrap and pMapEnd
+// are set is all it needs. One reader per file, no lock.
+//
+// Everything is judged, and then worked on, as a copy of the record's header,
+// so that nothing which changes in the mapping meanwhile can move a bound after
+// its test. What stands on the oldest position may be half replaced when it is
+// judged; a writer therefore keeps every mixture of old and new words sound.
 #pragma once
 
 #include "kelvo.h"
+#include "shared_words.h"
 #include "trace_load.h"
 
 /// Offset of a record from the start of the file.
@@ -12,10 +18,12 @@ uint32_t get_record_offset(const trace_file* pTraceFile, const trace_record_head
 
 /// A copy of the header at `pRec`, each word read once. `pRec` must leave 28
 /// bytes before pMapEnd.
-trace_record_header read_record_header(const trace_record_header* pRec);
+inline trace_record_header read_record_header(const trace_record_header* pRec) {
+    return load_record_header(pRec);
+}
 
 /// The bytes of the record at `pRec` whose length field was read as `length`:
-/// cut at the end of the mapping.
+/// cut at the end of the mapping; empty when `pRec` lies outside.
 trace_bytes record_bytes(const trace_file* pTraceFile, const trace_record_header* pRec,
                          uint32_t length);
 
@@ -25,7 +33,8 @@ int record_is_bad(const trace_record_header* pRec, const trace_record_header& he
                   const trace_file* pTraceFile);
 
 /// 1 when pCurRec is out of bounds or its record corrupt (the warning is
-/// written), else 0. Fills `pHeader` with the copy that was judged.
+/// written), else 0. Fills `pHeader` with the copy that was judged, unless
+/// pCurRec is out of bounds.
 int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_header* pHeader);
 
 /// Results of is_last_record and get_next_record.
@@ -36,14 +45,16 @@ enum walk_result : int {
 };
 
 /// Whether a record can be read at pCurRec; fills `pHeader` with the copy of
-/// its header that was judged and is to be worked on.
+/// its header that was judged and is to be worked on. May be asked again at the
+/// same position any number of times.
 walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader);
 
 /// Steps past the record at pCurRec, which is_last_record has just found
 /// readable and copied to `current`; the step goes by that copy. Returns
-/// WALK_RECORD or WALK_CORRUPT.
+/// WALK_RECORD, or WALK_CORRUPT when the new position is bad. Raises uSeqLock
+/// past the record: from then on the writer may overwrite it.
 walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current);
 
-/// is_last_record, then the step. On anything but WALK_RECORD no step was taken
-/// or the new position is bad.
+/// is_last_record, then the step. On WALK_NO_RECORD no step was taken; on
+/// WALK_CORRUPT none was taken or the new position is bad.
 walk_result get_next_record(trace_file* pTraceFile);

@@ -1,0 +1,129 @@
+#include "first_record.h"
+
+#include "corruption.h"
+#include "ring.h"
+#include "shared_words.h"
+#include "walk.h"
+
+#include <algorithm>
+#include <unistd.h>
+
+namespace {
+
+constexpr int TAIL_WAITS = 5;
+constexpr useconds_t TAIL_WAIT_US = 10'000;
+
+/// A walk over the ring that ends after one turn whatever the lengths are.
+struct ring_search {
+    const trace_file* pTraceFile;
+    uint64_t uOffset;
+    uint64_t uWalked = 0; ///< bytes from where the search began
+
+    bool stands_on_record() const {
+        return ring_holds_header(pTraceFile, uOffset);
+    }
+
+    trace_record_header header() const {
+        return read_record_header(ring_position(pTraceFile, uOffset));
+    }
+
+    bool stands_on_oldest() const {
+        return uOffset == load_oldest_record_offset(pTraceFile->pHeader);
+    }
+
+    bool has_gone_round() const {
+        return uWalked >= ring_size(pTraceFile);
+    }
+
+    /// A step that reaches or passes the end goes on at the start of the area.
+    void step(uint32_t uLength) {
+        const uint64_t uLeft = ring_end(pTraceFile) - uOffset;
+        uWalked += std::min<uint64_t>(uLength, uLeft);
+        uOffset = uLength < uLeft ? uOffset + uLength : ring_start(pTraceFile);
+    }
+};
+
+bool is_passed_over(uint16_t uFunction) {
+    return uFunction == TRC_FUNC_FILLER || uFunction == TRC_FUNC_WRITING;
+}
+
+int give_up_at(const ring_search& search) {
+    warn_out_of_bounds(search.pTraceFile, ring_position(search.pTraceFile, search.uOffset));
+    return -1;
+}
+
+/// Time base of a record: a start record brings its own.
+cu_timeinfo time_base(const trace_file* pTraceFile, uint64_t uOffset,
+                      const trace_record_header& header) {
+    constexpr size_t OWN_BASE = offsetof(trace_record_start, timeInfo);
+    const trace_bytes record =
+        record_bytes(pTraceFile, ring_position(pTraceFile, uOffset), header.length);
+    if (header.function != TRC_FUNC_START || !lies_inside(record, OWN_BASE, sizeof(cu_timeinfo)))
+        return pTraceFile->timeInfo;
+    return load<cu_timeinfo>(record, OWN_BASE);
+}
+
+} // namespace
+
+void request_tail(trace_file* pTraceFile) {
+    store_tail_request(pTraceFile->pHeader, TRC_TAIL_REQUESTED);
+    for (int i = 0; i < TAIL_WAITS; ++i) {
+        usleep(TAIL_WAIT_US);
+        if (tail_request_is_acknowledged(pTraceFile->pHeader))
+            return;
+    }
+}
+
+void release_tail(trace_file* pTraceFile) {
+    store_tail_request(pTraceFile->pHeader, 0);
+}
+
+int find_first_record(trace_file* pTraceFile) {
+    trace_file_header* const pHeader = pTraceFile->pHeader;
+    ring_search search{pTraceFile, load_oldest_record_offset(pHeader)};
+    pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);
+    pTraceFile->uUncountedBytes = 0;
+    if (!search.stands_on_record())
+        return give_up_at(search);
+    trace_record_header header = search.header();
+    store_seq_lock(pHeader, header.seqNumber);
+
+    while (is_passed_over(header.function)) {
+        if (header.length < sizeof(trace_record_header)) {
+            warn_record_length(pTraceFile, static_cast<uint32_t>(search.uOffset), header.length);
+            return -1;
+        }
+        search.step(header.length);
+        pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);
+        if (!search.stands_on_record())
+            return give_up_at(search);
+        if (search.stands_on_oldest())
+            return 0;
+        if (search.has_gone_round())
+            return give_up_at(search);
+        header = search.header();
+        store_seq_lock(pHeader, header.seqNumber);
+        cu_cvt_time_platform_1(header.timeStamp, &pTraceFile->timeInfo, &pTraceFile->modTime,
+                               pTraceFile->uPlatform);
+        pTraceFile->timeStampIsValid = 1;
+    }
+    return 0;
+}
+
+bool oldest_record_time(const trace_file* pTraceFile, cu_nanoseconds* pTime) {
+    ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
+    while (search.stands_on_record() && !search.has_gone_round()) {
+        const trace_record_header header = search.header();
+        if (header.function >= TRC_FUNC_ID && header.function <= TRC_FUNC_TIME_CALIBRATION) {
+            *pTime = cu_time_ns(header.timeStamp, time_base(pTraceFile, search.uOffset, header));
+            return true;
+        }
+        const bool bPassable = is_passed_over(header.function) ||
+                               header.function == TRC_FUNC_RESTART ||
+                               header.function == TRC_FUNC_DISCARDED;
+        if (!bPassable || header.length < sizeof(trace_record_header))
+            return false;
+        search.step(header.length);
+    }
+    return false;
+}

@@ -1,0 +1,44 @@
+#include "platform.h"
+
+#include <iterator>
+
+namespace {
+
+/// Code of the platform that this program runs on.
+constexpr uint8_t RUNNING_PLATFORM = 2;
+
+/// Display names by platform code.
+constexpr const char* platform_map[] = {
+    "Unknown",       "Solaris SPARC",   "Linux x86-64",   "Windows x86",
+    "Linux PowerPC", "Linux PowerPC64", "Solaris x86-64", "FreeBSD x86-64",
+    "macOS x86-64",  "Linux ARM64",     "HP-UX Itanium",  "Linux S390x",
+};
+static_assert(std::size(platform_map) == 12);
+
+} // namespace
+
+const char* platform_name(uint8_t platform) {
+    return platform < std::size(platform_map) ? platform_map[platform] : platform_map[0];
+}
+
+int is_LE_linux_platform(uint8_t platform) {
+    return platform == 2 || platform == 9;
+}
+
+int is_BE_linux_platform(uint8_t platform) {
+    return platform == 4 || platform == 5 || platform == 11;
+}
+
+int is_BE_unix_platform(uint8_t platform) {
+    return platform == 1;
+}
+
+int is_compatible_platform_to_run(uint8_t platform) {
+    if (platform == RUNNING_PLATFORM)
+        return 1;
+    if (is_LE_linux_platform(RUNNING_PLATFORM))
+        return is_LE_linux_platform(platform);
+    if (is_BE_linux_platform(RUNNING_PLATFORM))
+        return is_BE_linux_platform(platform);
+    return platform == 0;
+}

@@ -1,0 +1,134 @@
+// Two orders of reading matter here, both because the writer goes on meanwhile.
+// It writes a record at the oldest position first and moves uOldestRecordOffset
+// past it afterwards; so the offset is read before the record: a record found
+// behind a moved offset is then complete, and one found at the offset is
+// complete when its seqNumber is the expected one, which is read before the
+// rest of it.
+#include "walk.h"
+
+#include "corruption.h"
+#include "ring.h"
+
+#include <algorithm>
+
+namespace {
+
+bool function_is_valid(uint16_t uFunction) {
+    return uFunction <= TRC_FUNC_TIME_CALIBRATION || uFunction == TRC_FUNC_RESTART ||
+           uFunction == TRC_FUNC_DISCARDED;
+}
+
+/// Kinds whose compId names a component; the other valid ones leave it open.
+bool function_has_component(uint16_t uFunction) {
+    return uFunction >= TRC_FUNC_ID && uFunction <= TRC_FUNC_START;
+}
+
+bool component_is_printable(const char (&compId)[4]) {
+    return std::all_of(std::begin(compId), std::end(compId),
+                       [](char ch) { return ch >= 0x20 && ch <= 0x7E; });
+}
+
+bool counts_in_sequence(const trace_record_header& header) {
+    return header.function != TRC_FUNC_FILLER || header.seqNumber != TRC_SEQ_FILLER;
+}
+
+/// Whether the reader, standing on the oldest position, has read all there is:
+/// the record is not the next one in sequence, or it is the first of a whole
+/// turn of fillers, which have no place in the sequence and would let the walk
+/// go round for ever. A record that counts is judged by its seqNumber alone, so
+/// that a writer which goes on after such a turn is noticed.
+bool has_caught_up(const trace_file* pTraceFile, const trace_record_header& header) {
+    if (header.seqNumber != load_seq_lock(pTraceFile->pHeader) ||
+        header.function == TRC_FUNC_WRITING)
+        return true;
+    return !counts_in_sequence(header) && pTraceFile->uUncountedBytes >= ring_size(pTraceFile);
+}
+
+} // namespace
+
+uint32_t get_record_offset(const trace_file* pTraceFile, const trace_record_header* pRec) {
+    return static_cast<uint32_t>(ring_offset(pTraceFile, pRec));
+}
+
+trace_bytes record_bytes(const trace_file* pTraceFile, const trace_record_header* pRec,
+                         uint32_t length) {
+    const uint64_t uOffset = ring_offset(pTraceFile, pRec);
+    const uint64_t uEnd = ring_end(pTraceFile);
+    if (uOffset >= uEnd)
+        return {};
+    return {reinterpret_cast<const std::byte*>(pRec), std::min<size_t>(length, uEnd - uOffset)};
+}
+
+int record_is_bad(const trace_record_header* pRec, const trace_record_header& header,
+                  const trace_file* pTraceFile) {
+    if (!function_is_valid(header.function)) [[unlikely]] {
+        warn_record_function(pTraceFile, get_record_offset(pTraceFile, pRec), header.function);
+        return 1;
+    }
+    if (function_has_component(header.function) && !component_is_printable(header.compId))
+        [[unlikely]] {
+        warn_record_component(pTraceFile, get_record_offset(pTraceFile, pRec), header.compId);
+        return 1;
+    }
+    if (header.length < sizeof(trace_record_header)) [[unlikely]] {
+        warn_record_length(pTraceFile, get_record_offset(pTraceFile, pRec), header.length);
+        return 1;
+    }
+    return 0;
+}
+
+int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_header* pHeader) {
+    const trace_record_header* const pRec = pTraceFile->pCurRec;
+    if (!ring_holds_header(pTraceFile, ring_offset(pTraceFile, pRec))) [[unlikely]] {
+        warn_out_of_bounds(pTraceFile, pRec);
+        return 1;
+    }
+    *pHeader = read_record_header(pRec);
+    return record_is_bad(pRec, *pHeader, pTraceFile);
+}
+
+walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader) {
+    const uint32_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
+    if (current_record_pointer_is_bad(pTraceFile, pHeader))
+        return WALK_CORRUPT;
+    if (!ring_holds_header(pTraceFile, uOldest)) [[unlikely]] {
+        warn_out_of_bounds(pTraceFile, ring_position(pTraceFile, uOldest));
+        return WALK_CORRUPT;
+    }
+    const uint32_t uOffset = get_record_offset(pTraceFile, pTraceFile->pCurRec);
+    if (load_actual_file_size(pTraceFile->pHeader) < uOffset) [[unlikely]] {
+        warn_beyond_file_size(uOffset);
+        return WALK_NO_RECORD;
+    }
+    if (uOffset < uOldest && uOffset + pHeader->length > uOldest) [[unlikely]] {
+        warn_runs_over_oldest(uOffset, *pHeader);
+        return WALK_NO_RECORD;
+    }
+    if (uOffset == uOldest && has_caught_up(pTraceFile, *pHeader))
+        return WALK_NO_RECORD;
+    return WALK_RECORD;
+}
+
+walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current) {
+    uint64_t uNext = ring_offset(pTraceFile, pTraceFile->pCurRec) + current.length;
+    if (uNext == ring_end(pTraceFile))
+        uNext = ring_start(pTraceFile);
+    pTraceFile->pCurRec = ring_position(pTraceFile, uNext);
+
+    trace_record_header next;
+    if (current_record_pointer_is_bad(pTraceFile, &next))
+        return WALK_CORRUPT;
+    if (counts_in_sequence(current)) {
+        pTraceFile->uUncountedBytes = 0;
+        store_seq_lock(pTraceFile->pHeader, load_seq_lock(pTraceFile->pHeader) + 2);
+    } else {
+        pTraceFile->uUncountedBytes += current.length;
+    }
+    return WALK_RECORD;
+}
+
+walk_result get_next_record(trace_file* pTraceFile) {
+    trace_record_header current;
+    const walk_result here = is_last_record(pTraceFile, &current);
+    return here == WALK_RECORD ? step_to_next_record(pTraceFile, current) : here;
+}
