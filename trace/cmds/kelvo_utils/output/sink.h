@@ -1,9 +1,22 @@
 // The character sink: every text of a record, and every message to standard
 // output, passes through it. It keeps the column, indents the lines of a record
 // body and interprets the nesting markers at its start. Main thread only.
+//
+// A body begins at column headerIndent + 2 * nesting level and so does each of
+// its further lines. Columns are signed 16-bit values: a body nested deeper
+// than they reach begins at MAX_INDENT, and a thread's level stops at
+// MAX_NESTING_LEVEL, so that neither ever wraps.
 #pragma once
 
+#include <cstdint>
 #include <string_view>
+
+/// Rightmost column at which a body begins; leaves room for one held-back
+/// marker character after it.
+inline constexpr int16_t MAX_INDENT = INT16_MAX - 1;
+
+/// Deepest level that is counted.
+inline constexpr uint16_t MAX_NESTING_LEVEL = UINT16_MAX;
 
 /// Writes one character.
 void output_char(char ch);
@@ -13,3 +26,7 @@ void output_text(std::string_view text);
 
 /// The same as output_char for each character; null writes nothing.
 void output_string(const char* pString);
+
+/// Gives up a record that was opened and will not be closed: the sink is
+/// between records again. A line that it has begun is ended.
+void output_abandon_rec();

@@ -2,9 +2,13 @@
 // other function of the command writes to file descriptor 1.
 //
 // A stream of our own rather than stdio's: a signal that interrupts a write
-// must not lose buffered text, and no character may cost a lock.
+// must not lose buffered text, and no character may cost a lock. On a terminal
+// every line is shown as soon as it is complete; elsewhere text leaves in
+// pieces of the whole buffer, or when the caller flushes. Nothing is written at
+// exit: the end of the run flushes.
 #pragma once
 
+#include <cstddef>
 #include <string_view>
 
 /// Appends one byte; writes the buffer out when it is full.
@@ -12,6 +16,9 @@ void stdout_put(char ch);
 
 /// Appends bytes; writes the buffer out when it is full.
 void stdout_write(std::string_view text);
+
+/// Appends `ch` `count` times.
+void stdout_fill(char ch, size_t count);
 
 /// Writes everything appended so far. Interrupted and partial writes go on
 /// where they stopped. After the first failed write the stream drops all text.
@@ -22,3 +29,7 @@ bool stdout_is_empty();
 
 /// errno of the first failed write, 0 when none failed.
 int stdout_error();
+
+/// Starts afresh on what is descriptor 1 now: buffered text and a remembered
+/// error are dropped, and whether it is a terminal is found out anew.
+void stdout_reset();

@@ -1,0 +1,49 @@
+#include "print.h"
+
+#include "bounded_printf.h"
+#include "handover.h"
+#include "sink.h"
+
+#include <algorithm>
+#include <string_view>
+
+namespace {
+
+constexpr std::string_view REPLACEMENT = "kelvo error in output_vprintf()";
+
+using format_buffer = char[BOUNDED_PRINTF_SIZE];
+
+// The formatted text, cut at what the buffer keeps, or the replacement.
+__attribute__((format(printf, 2, 0))) std::string_view
+format_text(format_buffer& buffer, const char* pFormat, va_list args) {
+    const int length = bounded_vsnprintf(buffer, sizeof buffer, pFormat, args);
+    if (length < 0)
+        return REPLACEMENT;
+    return {buffer, std::min(static_cast<size_t>(length), sizeof buffer - 1)};
+}
+
+} // namespace
+
+void output_vprintf(const char* pFormat, va_list pArgs) {
+    format_buffer buffer;
+    output_text(format_text(buffer, pFormat, pArgs));
+}
+
+void output_printf(const char* pFormat, ...) {
+    va_list args;
+    va_start(args, pFormat);
+    output_vprintf(pFormat, args);
+    va_end(args);
+}
+
+void output_message(const char* pMsg, ...) {
+    format_buffer buffer;
+    va_list args;
+    va_start(args, pMsg);
+    const std::string_view text = format_text(buffer, pMsg, args);
+    va_end(args);
+    if (owns_standard_output())
+        output_text(text);
+    else
+        hand_over_output(text, false);
+}

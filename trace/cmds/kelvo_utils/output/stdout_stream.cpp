@@ -1,0 +1,83 @@
+#include "stdout_stream.h"
+
+#include "write_all.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <unistd.h>
+
+namespace {
+
+constexpr size_t BUFFER_SIZE = 64 * 1024; // what a pipe takes in one piece
+
+enum class terminal_state { UNKNOWN, NO, YES };
+
+struct {
+    size_t uUsed = 0; // always below BUFFER_SIZE between calls
+    int iError = 0;
+    terminal_state terminal = terminal_state::UNKNOWN;
+    alignas(4096) char pBuffer[BUFFER_SIZE];
+} stream;
+
+bool is_terminal() {
+    if (stream.terminal == terminal_state::UNKNOWN) {
+        const int savedErrno = errno;
+        stream.terminal = isatty(STDOUT_FILENO) ? terminal_state::YES : terminal_state::NO;
+        errno = savedErrno;
+    }
+    return stream.terminal == terminal_state::YES;
+}
+
+} // namespace
+
+void stdout_put(char ch) {
+    stream.pBuffer[stream.uUsed++] = ch;
+    if (stream.uUsed == BUFFER_SIZE || (ch == '\n' && is_terminal()))
+        stdout_flush();
+}
+
+void stdout_write(std::string_view text) {
+    const bool bLineEnds = is_terminal() && text.find('\n') != text.npos;
+    while (!text.empty()) {
+        const size_t size = std::min(text.size(), BUFFER_SIZE - stream.uUsed);
+        std::memcpy(stream.pBuffer + stream.uUsed, text.data(), size);
+        stream.uUsed += size;
+        text.remove_prefix(size);
+        if (stream.uUsed == BUFFER_SIZE)
+            stdout_flush();
+    }
+    if (bLineEnds)
+        stdout_flush();
+}
+
+void stdout_fill(char ch, size_t count) {
+    while (count > 0) {
+        const size_t size = std::min(count, BUFFER_SIZE - stream.uUsed);
+        std::memset(stream.pBuffer + stream.uUsed, ch, size);
+        stream.uUsed += size;
+        count -= size;
+        if (stream.uUsed == BUFFER_SIZE)
+            stdout_flush();
+    }
+}
+
+void stdout_flush() {
+    if (stream.iError == 0)
+        stream.iError = write_all(STDOUT_FILENO, {stream.pBuffer, stream.uUsed});
+    stream.uUsed = 0;
+}
+
+bool stdout_is_empty() {
+    return stream.uUsed == 0;
+}
+
+int stdout_error() {
+    return stream.iError;
+}
+
+void stdout_reset() {
+    stream.uUsed = 0;
+    stream.iError = 0;
+    stream.terminal = terminal_state::UNKNOWN;
+}
