@@ -1,0 +1,310 @@
+// The compiler of format strings. One pass over the string:
+//
+//   format     = { literal | "%%" | conversion }
+//   conversion = "%" [number] { flag } [width] [precision] [length] letter
+//   number     = digits "$"                 numbered mode only, there required
+//   width      = "*" [number] | digits
+//   precision  = "." ( "*" [number] | [digits] )
+//   length     = "h" | "l" | "ll" | "L"
+//
+// The first conversion decides for the whole string whether its parameters are
+// numbered. What is found is collected in arrays of fixed size and moved into
+// one block at the end, so that a refused string leaves nothing behind.
+#include "compile.h"
+
+#include "messages.h"
+
+#include <cstdlib>
+#include <cstring>
+#include <limits>
+#include <memory>
+#include <new>
+#include <string_view>
+
+namespace {
+
+constexpr uint8_t NO_PARM = 255;
+constexpr int MAX_NUMBER_DIGITS = 15;
+constexpr std::string_view FLAG_CHARACTERS = "'-+ #0BNJ";
+
+enum class numbering { undecided, sequential, numbered };
+
+enum length_modifier { LENGTH_NONE, LENGTH_H, LENGTH_L, LENGTH_LL, LENGTH_LONG_DOUBLE };
+
+constexpr parm_type_t unsigned_of(parm_type_t type) {
+    return static_cast<parm_type_t>(type | PARM_UNSIGNED);
+}
+
+/// Conversion letters of one family and the type that each length modifier,
+/// in the order of length_modifier, gives to the parameter.
+struct letter_family {
+    std::string_view letters;
+    parm_type_t types[5];
+};
+
+constexpr letter_family every_length(std::string_view letters, parm_type_t type) {
+    return {letters, {type, type, type, type, type}};
+}
+
+constexpr letter_family LETTER_FAMILIES[] = {
+    {"di", {PARM_INT, PARM_SHORT, PARM_LONG, PARM_LONGLONG, PARM_INT}},
+    {"ouxX",
+     {unsigned_of(PARM_INT), unsigned_of(PARM_SHORT), unsigned_of(PARM_LONG),
+      unsigned_of(PARM_LONGLONG), unsigned_of(PARM_INT)}},
+    {"eEfgG", {PARM_DOUBLE, PARM_FLOAT, PARM_DOUBLE, PARM_DOUBLE, PARM_LONGDOUBLE}},
+    every_length("cC", unsigned_of(PARM_CHAR)),
+    every_length("sS", PARM_STRING),
+    every_length("p", unsigned_of(PARM_LONG)),
+    every_length("r", PARM_RESOURCE_HANDLE),
+    every_length("z", PARM_REST),
+    every_length("T", PARM_TRACE_ID),
+};
+
+/// The state of one compilation.
+struct format_scan {
+    const char* pString;
+    const char* pNext; ///< next character to look at
+    int lineNumber;    ///< for messages
+    numbering mode;
+    int numParms;
+    int numConvs;
+    parm_type_t parmTypes[MAX_PARMS];
+    conv_spec convSpecs[MAX_PARMS];
+};
+
+/// A '*' width or precision: where it stands, and its parameter.
+struct star_place {
+    size_t uOffset = 0;
+    uint8_t parmNum = NO_PARM;
+};
+
+constexpr bool is_digit(char ch) {
+    return ch >= '0' && ch <= '9';
+}
+
+const char* skip_digits(const char* pText) {
+    while (is_digit(*pText))
+        ++pText;
+    return pText;
+}
+
+int refuse_too_many_parms(int lineNumber) {
+    output_err_message("%s: 2625-119 Format error on line %d. Too many parameters.\n",
+                       anchor.pProgName, lineNumber);
+    return -1;
+}
+
+bool refuse_unrepresentable(const format_scan& scan) {
+    output_err_message(
+        "%s: 2625-121 Format error on line %d. Format string cannot be represented.\n",
+        anchor.pProgName, scan.lineNumber);
+    return false;
+}
+
+/// The mode that a conversion sets whose '%' stands right before `pText`.
+numbering numbering_of(const char* pText) {
+    return is_digit(*pText) && *skip_digits(pText) == '$' ? numbering::numbered
+                                                          : numbering::sequential;
+}
+
+/// Takes the parameter that the conversion or the '*' before scan.pNext uses:
+/// the one it names, or the next of the sequence. Returns its index, or a
+/// negative value when the string is refused.
+int take_parm(format_scan& scan) {
+    int index = scan.numParms;
+    if (scan.mode == numbering::numbered) {
+        index = parse_parm_number(&scan.pNext, MAX_PARMS, scan.lineNumber);
+        if (index < 0)
+            return index;
+    }
+    if (index >= MAX_PARMS)
+        return refuse_too_many_parms(scan.lineNumber);
+    while (scan.numParms <= index)
+        scan.parmTypes[scan.numParms++] = PARM_UNREFERENCED;
+    return index;
+}
+
+/// Passes over a '*' with its parameter, or over digits. `pStart` is the
+/// conversion's '%'.
+bool scan_star_or_digits(format_scan& scan, const char* pStart, star_place& star) {
+    if (*scan.pNext != '*') {
+        scan.pNext = skip_digits(scan.pNext);
+        return true;
+    }
+    star.uOffset = static_cast<size_t>(scan.pNext - pStart);
+    ++scan.pNext;
+    const int index = take_parm(scan);
+    if (index < 0)
+        return false;
+    scan.parmTypes[index] = PARM_INT;
+    star.parmNum = static_cast<uint8_t>(index);
+    return true;
+}
+
+length_modifier scan_length_modifier(format_scan& scan) {
+    switch (*scan.pNext) {
+    case 'h':
+        ++scan.pNext;
+        return LENGTH_H;
+    case 'L':
+        ++scan.pNext;
+        return LENGTH_LONG_DOUBLE;
+    case 'l':
+        ++scan.pNext;
+        if (*scan.pNext != 'l')
+            return LENGTH_L;
+        ++scan.pNext;
+        return LENGTH_LL;
+    default:
+        return LENGTH_NONE;
+    }
+}
+
+/// Reads the conversion letter and gives its type to parameter `index`.
+bool scan_letter(format_scan& scan, length_modifier length, int index) {
+    const char letter = *scan.pNext;
+    for (const letter_family& family : LETTER_FAMILIES) {
+        if (family.letters.find(letter) == std::string_view::npos)
+            continue;
+        scan.parmTypes[index] = family.types[length];
+        ++scan.pNext;
+        return true;
+    }
+    output_err_message("%s: 2625-120 Format error on line %d. Invalid data type %c specified.\n",
+                       anchor.pProgName, scan.lineNumber, letter);
+    return false;
+}
+
+/// Records a conversion that was read to its letter, if the narrow fields of a
+/// conv_spec can hold it and there is room for one more.
+bool record_conversion(format_scan& scan, const char* pStart, int valueParm, star_place width,
+                       star_place precision) {
+    const auto uOffset = static_cast<size_t>(pStart - scan.pString);
+    const auto uLength = static_cast<size_t>(scan.pNext - pStart);
+    if (scan.numConvs == MAX_PARMS || uOffset > std::numeric_limits<uint16_t>::max() ||
+        uLength > std::numeric_limits<uint8_t>::max())
+        return refuse_unrepresentable(scan);
+    conv_spec& conv = scan.convSpecs[scan.numConvs++];
+    conv.parmNum = static_cast<uint8_t>(valueParm);
+    conv.widthOffset = static_cast<uint8_t>(width.uOffset);
+    conv.widthParmNum = width.parmNum;
+    conv.precOffset = static_cast<uint8_t>(precision.uOffset);
+    conv.precParmNum = precision.parmNum;
+    conv.lenConv = static_cast<uint8_t>(uLength);
+    conv.offset = static_cast<uint16_t>(uOffset);
+    return true;
+}
+
+/// Reads the conversion whose '%' scan.pNext points to. The value takes its
+/// parameter before the width and the precision take theirs.
+bool scan_conversion(format_scan& scan) {
+    const char* const pStart = scan.pNext++;
+    if (scan.mode == numbering::undecided)
+        scan.mode = numbering_of(scan.pNext);
+    const int valueParm = take_parm(scan);
+    if (valueParm < 0)
+        return false;
+    // The NUL at the end of the string is no member of the view.
+    while (FLAG_CHARACTERS.find(*scan.pNext) != std::string_view::npos)
+        ++scan.pNext;
+    star_place width;
+    if (!scan_star_or_digits(scan, pStart, width))
+        return false;
+    star_place precision;
+    if (*scan.pNext == '.') {
+        ++scan.pNext;
+        if (!scan_star_or_digits(scan, pStart, precision))
+            return false;
+    }
+    const length_modifier length = scan_length_modifier(scan);
+    return scan_letter(scan, length, valueParm) &&
+           record_conversion(scan, pStart, valueParm, width, precision);
+}
+
+bool scan_format(format_scan& scan) {
+    while ((scan.pNext = std::strchr(scan.pNext, '%')) != nullptr) {
+        if (scan.pNext[1] == '%')
+            scan.pNext += 2;
+        else if (!scan_conversion(scan))
+            return false;
+    }
+    for (int index = 0; index < scan.numParms; ++index) {
+        if (scan.parmTypes[index] != PARM_UNREFERENCED)
+            continue;
+        output_err_message("%s: 2625-122 Format error on line %d. Argument %d is not referenced in "
+                           "format string.\n",
+                           anchor.pProgName, scan.lineNumber, index + 1);
+        return false;
+    }
+    return true;
+}
+
+/// Moves what was found into one block: the entry, its conversions, its type
+/// codes, its string. Each part needs no stricter alignment than the one before
+/// it, so nothing is padded. Null when memory is exhausted.
+format_entry* make_entry(const format_scan& scan) {
+    static_assert(sizeof(format_entry) % alignof(conv_spec) == 0);
+    static_assert(sizeof(parm_type_t) == 1);
+    const auto uConvs = static_cast<size_t>(scan.numConvs);
+    const auto uParms = static_cast<size_t>(scan.numParms);
+    const size_t uStringSize = std::strlen(scan.pString) + 1;
+    const size_t uConvsAt = sizeof(format_entry);
+    const size_t uTypesAt = uConvsAt + uConvs * sizeof(conv_spec);
+    const size_t uStringAt = uTypesAt + uParms;
+
+    auto* const pBlock = static_cast<std::byte*>(std::malloc(uStringAt + uStringSize));
+    if (pBlock == nullptr)
+        return nullptr;
+    auto* const pEntry = new (pBlock) format_entry{};
+    pEntry->block_id = -1;
+    pEntry->properties = scan.mode == numbering::numbered ? FORMAT_NUMBERED_PARMS : 0;
+    pEntry->numParms = scan.numParms;
+    pEntry->numConvs = scan.numConvs;
+    pEntry->pConvSpecs = reinterpret_cast<conv_spec*>(pBlock + uConvsAt);
+    std::uninitialized_copy_n(scan.convSpecs, uConvs, pEntry->pConvSpecs);
+    pEntry->pParmTypes = reinterpret_cast<parm_type_t*>(pBlock + uTypesAt);
+    std::uninitialized_copy_n(scan.parmTypes, uParms, pEntry->pParmTypes);
+    pEntry->pString = reinterpret_cast<char*>(pBlock + uStringAt);
+    std::memcpy(pEntry->pString, scan.pString, uStringSize);
+    return pEntry;
+}
+
+} // namespace
+
+int parse_parm_number(const char** ppFormat, int maxParms, int lineNumber) {
+    const char* pText = *ppFormat;
+    int64_t number = 0;
+    int numDigits = 0;
+    for (; numDigits < MAX_NUMBER_DIGITS && is_digit(*pText); ++numDigits)
+        number = number * 10 + (*pText++ - '0');
+    if (numDigits == 0 || *pText != '$') {
+        output_err_message(
+            "%s: 2625-118 Format error on line %d. Parameter number expected in format.\n",
+            anchor.pProgName, lineNumber);
+        return -1;
+    }
+    *ppFormat = pText + 1;
+    if (number >= maxParms)
+        return refuse_too_many_parms(lineNumber);
+    return static_cast<int>(number) - 1;
+}
+
+format_entry* parse_format_string(const char* pString, template_file* pFile) {
+    format_scan scan;
+    scan.pString = pString;
+    scan.pNext = pString;
+    scan.lineNumber = pFile != nullptr ? pFile->lineNumber : 1;
+    scan.mode = numbering::undecided;
+    scan.numParms = 0;
+    scan.numConvs = 0;
+    if (!scan_format(scan))
+        return nullptr;
+
+    format_entry* const pEntry = make_entry(scan);
+    if (pEntry != nullptr && pFile != nullptr) {
+        pEntry->pFile = pFile;
+        pEntry->pNext = pFile->pFormats;
+        pFile->pFormats = pEntry;
+    }
+    return pEntry;
+}

@@ -1,0 +1,46 @@
+// The template search path: its directories, and the files in them.
+#pragma once
+
+#include "kelvo.h"
+
+#include <cstdio>
+#include <memory>
+#include <string_view>
+
+/// A file name that is put together from parts, always NUL-terminated. It never
+/// grows beyond what template_file::preload_path holds.
+struct file_name_text {
+    char text[sizeof(template_file::preload_path)] = "";
+    size_t uLength = 0;
+
+    /// Appends `part`; false, with the name unchanged, when it does not fit.
+    bool append(std::string_view part);
+
+    /// Appends a "/" unless the name ends in one; false when it does not fit.
+    bool append_slash();
+};
+
+struct file_closer {
+    void operator()(FILE* pFile) const {
+        std::fclose(pFile);
+    }
+};
+using file_owner = std::unique_ptr<FILE, file_closer>;
+
+/// Takes the first directory off `*pPath`. It may be empty (the current working
+/// directory). False when nothing is left.
+bool take_first_directory(std::string_view* pPath, std::string_view* pDirectory);
+
+/// Takes the last directory off `*pPath`. It may be empty. False when nothing
+/// is left.
+bool take_last_directory(std::string_view* pPath, std::string_view* pDirectory);
+
+/// Puts the name of the component's template file in `directory` into `*pName`.
+/// False when there is none: the directory lies above the root, the name is too
+/// long, or the current working directory is needed and cannot be determined.
+bool build_template_file_name(std::string_view directory, const char* compId,
+                              file_name_text* pName);
+
+/// Opens a template file for reading; null when it cannot be opened or is not a
+/// regular file (opening a FIFO or a device must not hang the run).
+file_owner open_template_file(const char* pFileName);

@@ -1,0 +1,32 @@
+// Makes, fills, asks and releases one template. Main thread only.
+#pragma once
+
+#include "kelvo.h"
+
+#include <cstdio>
+#include <memory>
+
+/// Releases a template with its entries and its index.
+void release_template(template_file* pTemplate);
+
+/// Releases the entries of a template and its index; the template is then empty.
+void release_formats(template_file* pTemplate);
+
+struct template_releaser {
+    void operator()(template_file* pTemplate) const {
+        release_template(pTemplate);
+    }
+};
+using template_owner = std::unique_ptr<template_file, template_releaser>;
+
+/// A new template without entries for the component whose id begins at `compId`
+/// (4 characters), or null when memory is exhausted.
+template_owner make_template(const char* compId);
+
+/// Parses `pFile` into the template and indexes what it holds. Result and flag
+/// are those of parse_template_file; the caller closes `pFile`.
+int read_template(template_file* pTemplate, const char* pFileName, FILE* pFile,
+                  int* p_insufficient_resources);
+
+/// The newest entry with this trace id and block id, or null.
+format_entry* find_format(const template_file* pTemplate, uint32_t trace_id, int block_id);
