@@ -1,0 +1,193 @@
+// A field that is written directly has the shape
+//
+//     blanks  prefix  zeros  digits  blanks
+//
+// with blanks on one side only; the prefix is the sign or "0x".
+
+#include "field.h"
+
+#include "print.h"
+
+#include <charconv>
+#include <climits>
+#include <cstdint>
+
+namespace {
+
+/// What the text writers put in place of a text that cannot be formatted.
+constexpr std::string_view replacementText = "kelvo error in output_vprintf()";
+
+struct field_parts {
+    std::string_view prefix;
+    int64_t iZeros = 0;
+    std::string_view digits;
+    bool bZeroPadding = false; ///< fill the width with zeros after the prefix
+};
+
+int64_t size_of(std::string_view text) {
+    return static_cast<int64_t>(text.size());
+}
+
+/// A text of which only the first MAX_FIELD_TEXT characters go out.
+class kept_text {
+public:
+    explicit kept_text(text_run& run) : out(run) {}
+
+    void add(std::string_view piece) {
+        piece = piece.substr(0, uLeft);
+        out.add(piece);
+        uLeft -= piece.size();
+    }
+
+    void fill(char ch, int64_t iCount) {
+        const size_t uCount = std::min(static_cast<size_t>(iCount), uLeft);
+        out.fill(ch, uCount);
+        uLeft -= uCount;
+    }
+
+private:
+    text_run& out;
+    size_t uLeft = MAX_FIELD_TEXT;
+};
+
+/// printf refuses a width or precision that an int does not hold.
+bool is_refused(const conversion& conv) {
+    return conv.iWidth > INT_MAX || conv.iPrecision > INT_MAX;
+}
+
+void write_parts(text_run& out, const conversion& conv, const field_parts& parts) {
+    const int64_t iLength = size_of(parts.prefix) + parts.iZeros + size_of(parts.digits);
+    if (is_refused(conv) || iLength > INT_MAX) {
+        out.add(replacementText);
+        return;
+    }
+    const int64_t iPadding = std::max<int64_t>(conv.iWidth - iLength, 0);
+    const bool bLeft = conv.uFlags & CONVERSION_LEFT;
+    const bool bZeros = parts.bZeroPadding && !bLeft;
+
+    kept_text kept(out);
+    if (!bLeft && !bZeros)
+        kept.fill(' ', iPadding);
+    kept.add(parts.prefix);
+    kept.fill('0', parts.iZeros + (bZeros ? iPadding : 0));
+    kept.add(parts.digits);
+    if (bLeft)
+        kept.fill(' ', iPadding);
+}
+
+/// Writes a value by output_printf, with a conversion made here from the parts.
+template <class T>
+void write_by_printf(text_run& out, const conversion& conv, const char* pLength, T value) {
+    if (is_refused(conv)) {
+        out.add(replacementText);
+        return;
+    }
+    constexpr struct {
+        uint8_t uBit;
+        char ch;
+    } flags[] = {{CONVERSION_LEFT, '-'},   {CONVERSION_PLUS, '+'}, {CONVERSION_SPACE, ' '},
+                 {CONVERSION_ALTERN, '#'}, {CONVERSION_ZERO, '0'}, {CONVERSION_GROUP, '\''}};
+    char plain[16];
+    char* pEnd = plain;
+    *pEnd++ = '%';
+    for (const auto& flag : flags)
+        if (conv.uFlags & flag.uBit)
+            *pEnd++ = flag.ch;
+    for (const char* pPart = "*.*"; *pPart; pPart++)
+        *pEnd++ = *pPart;
+    for (const char* pPart = pLength; *pPart; pPart++)
+        *pEnd++ = *pPart;
+    *pEnd++ = conv.letter;
+    *pEnd = '\0';
+
+    out.flush();
+    output_printf(plain, static_cast<int>(conv.iWidth), static_cast<int>(conv.iPrecision), value);
+}
+
+bool is_signed(char letter) {
+    return letter == 'd' || letter == 'i';
+}
+
+/// The lowest `iBits` bits as a number, signed or not.
+int64_t narrow(uint64_t uValue, int iBits, bool bSigned) {
+    const int iUnused = 64 - iBits;
+    const uint64_t uShifted = uValue << iUnused;
+    return bSigned ? static_cast<int64_t>(uShifted) >> iUnused
+                   : static_cast<int64_t>(uShifted >> iUnused);
+}
+
+/// The digits of `uValue`, made in `buffer`.
+std::string_view make_digits(char (&buffer)[24], char letter, uint64_t uValue) {
+    const int iBase = letter == 'o' ? 8 : letter == 'x' || letter == 'X' ? 16 : 10;
+    char* pEnd = std::to_chars(buffer, std::end(buffer), uValue, iBase).ptr;
+    if (letter == 'X')
+        for (char* pDigit = buffer; pDigit < pEnd; pDigit++)
+            if (*pDigit >= 'a')
+                *pDigit = static_cast<char>(*pDigit - 'a' + 'A');
+    return {buffer, static_cast<size_t>(pEnd - buffer)};
+}
+
+std::string_view sign_of(const conversion& conv, bool bNegative) {
+    if (bNegative)
+        return "-";
+    if (conv.uFlags & CONVERSION_PLUS)
+        return "+";
+    return conv.uFlags & CONVERSION_SPACE ? " " : "";
+}
+
+/// What "#" adds to a number.
+void add_base_mark(field_parts& parts, char letter, bool bZero) {
+    if (letter == 'o' && parts.iZeros == 0 && !parts.digits.starts_with('0'))
+        parts.iZeros = 1;
+    else if (letter == 'x' && !bZero)
+        parts.prefix = "0x";
+    else if (letter == 'X' && !bZero)
+        parts.prefix = "0X";
+}
+
+void write_number(text_run& out, const conversion& conv, int64_t iValue) {
+    const bool bSigned = is_signed(conv.letter);
+    const bool bNegative = bSigned && iValue < 0;
+    const auto uValue = static_cast<uint64_t>(iValue);
+    char buffer[24];
+    field_parts parts;
+    if (bSigned)
+        parts.prefix = sign_of(conv, bNegative);
+    if (iValue != 0 || conv.iPrecision != 0)
+        parts.digits = make_digits(buffer, conv.letter, bNegative ? -uValue : uValue);
+    parts.iZeros = std::max<int64_t>(conv.iPrecision - size_of(parts.digits), 0);
+    if (conv.uFlags & CONVERSION_ALTERN)
+        add_base_mark(parts, conv.letter, iValue == 0);
+    parts.bZeroPadding = (conv.uFlags & CONVERSION_ZERO) && conv.iPrecision < 0;
+    write_parts(out, conv, parts);
+}
+
+} // namespace
+
+void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits) {
+    const int64_t iValue = narrow(uValue, iBits, is_signed(conv.letter));
+    if (conv.letter == 'p')
+        write_by_printf(out, conv, "", reinterpret_cast<void*>(static_cast<uintptr_t>(uValue)));
+    else if (conv.uFlags & CONVERSION_GROUP)
+        write_by_printf(out, conv, "ll", static_cast<long long>(iValue));
+    else
+        write_number(out, conv, iValue);
+}
+
+void write_real(text_run& out, const conversion& conv, double value) {
+    write_by_printf(out, conv, "", value);
+}
+
+void write_string(text_run& out, const conversion& conv, std::string_view value) {
+    if (conv.letter == 's' && conv.iPrecision >= 0)
+        value = value.substr(0, static_cast<size_t>(conv.iPrecision));
+    write_parts(out, conv, {.prefix = {}, .digits = value});
+}
+
+void write_hex(text_run& out, uint32_t uValue, int iDigits) {
+    conversion conv;
+    conv.letter = 'x';
+    conv.iPrecision = iDigits;
+    out.add("0x");
+    write_integer(out, conv, uValue, 32);
+}

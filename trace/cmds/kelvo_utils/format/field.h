@@ -1,0 +1,29 @@
+// Writes one value in the field of its conversion: the text that printf gives
+// for width, precision, flags and value, of which the first MAX_FIELD_TEXT
+// characters are kept. Integers, characters and strings are written directly,
+// the rest by output_printf. Main thread only, nothing is allocated.
+//
+// Widths and precisions may be as large as they like: padding is counted, not
+// made, beyond the characters kept.
+#pragma once
+
+#include "conversion.h"
+#include "text_run.h"
+
+#include <string_view>
+
+/// Characters kept of one field, as of one text of output_printf.
+inline constexpr size_t MAX_FIELD_TEXT = 4095;
+
+/// An integer by "diouxXp". `uValue` holds it in its lowest `iBits` bits (16,
+/// 32 or 64); the letter says whether they are signed.
+void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits);
+
+/// A floating-point number by "eEfgG".
+void write_real(text_run& out, const conversion& conv, double value);
+
+/// A string by "s", or a character by "c" (which has no precision).
+void write_string(text_run& out, const conversion& conv, std::string_view value);
+
+/// `uValue` as "0x" and at least `iDigits` lower-case hexadecimal digits.
+void write_hex(text_run& out, uint32_t uValue, int iDigits);

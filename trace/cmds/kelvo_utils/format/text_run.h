@@ -1,0 +1,63 @@
+// Collects the pieces of a text, so that the sink sees long runs in place of
+// single characters. Main thread only.
+#pragma once
+
+#include "sink.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstring>
+#include <string_view>
+
+/// Passes what it is given to output_text, in order, at the latest when it goes.
+class text_run {
+public:
+    text_run() = default;
+    text_run(const text_run&) = delete;
+    text_run& operator=(const text_run&) = delete;
+    ~text_run() {
+        flush();
+    }
+
+    void add(char ch) {
+        if (uLength == sizeof(text))
+            flush();
+        text[uLength++] = ch;
+    }
+
+    void add(std::string_view piece) {
+        if (piece.size() > sizeof(text) - uLength) {
+            flush();
+            if (piece.size() > sizeof(text)) {
+                output_text(piece);
+                return;
+            }
+        }
+        if (!piece.empty())
+            std::memcpy(text + uLength, piece.data(), piece.size());
+        uLength += piece.size();
+    }
+
+    /// `uCount` times `ch`.
+    void fill(char ch, size_t uCount) {
+        while (uCount > 0) {
+            if (uLength == sizeof(text))
+                flush();
+            const size_t uPart = std::min(uCount, sizeof(text) - uLength);
+            std::memset(text + uLength, ch, uPart);
+            uLength += uPart;
+            uCount -= uPart;
+        }
+    }
+
+    /// Needed before anything else writes to the sink.
+    void flush() {
+        if (uLength > 0)
+            output_text({text, uLength});
+        uLength = 0;
+    }
+
+private:
+    char text[512]; ///< not set up: a record must not pay for what it does not use
+    size_t uLength = 0;
+};
