@@ -44,11 +44,10 @@
 //    gap on, and has no place yet. The writer sets bit 15 of uFlags, gives up
 //    nothing and leaves uOldestRecordOffset alone. What is appended meanwhile
 //    is held: the gap keeps its place with 28 bytes, behind it grows a chain
-//    of records of function 0xFFFF and number 0xFFF, which the search skips,
-//    as far as the gap reaches; what has no room is dropped. When uTailReq is
-//    lowered, bit 15 is cleared, the held records get their functions and
-//    numbers, and uOldestRecordOffset moves behind them, all with the next
-//    append or poll.
+//    of records of function 0xFFFF, which the search skips, as far as the gap
+//    reaches; what has no room is dropped. When uTailReq is lowered, bit 15 is
+//    cleared, the held records get their functions and numbers, and
+//    uOldestRecordOffset moves behind them, all with the next append or poll.
 // 4. A reader that died leaves uSeqLock and uTailReq as they were. When it
 //    stands in the way, the writer asks, at most every 10 milliseconds, whether
 //    another process still holds a lock on the file, and if none does resets
@@ -62,7 +61,6 @@
 #include "trace_load.h"
 
 #include <initializer_list>
-#include <memory>
 #include <span>
 #include <string_view>
 
@@ -228,26 +226,75 @@ public:
     }
 
 private:
-    struct placement;
+    /// Where a record is going: made by begin, finished by commit.
+    struct open_record {
+        trace_record_header header{};
+        uint32_t uAt = 0;     ///< offset of the record
+        uint32_t uOldest = 0; ///< where the gap stands afterwards
+        uint32_t uGapEnd = 0; ///< and where it ends
+    };
+    /// What a record costs: how far the gap has to swallow the oldest records.
+    struct gap_plan {
+        uint32_t uEnd = 0;     ///< end of the grown gap
+        uint32_t uHeadEnd = 0; ///< end of a filler at the start of the area; 0: none
+        bool bWrap = false;    ///< the record goes to the start of the area
+        uint32_t uGivenUp = 0; ///< records swallowed
+    };
 
+    // trace_writer.cpp: the file
     trace_writer_status make_file(const char* pPath, const trace_writer_options& options);
-    void lay_out_header(const trace_writer_options& options);
-    void lay_out_empty_area(const trace_writer_options& options);
+    void lay_out_file(const trace_writer_options& options);
 
+    // ring.cpp: the place of a record
     trace_writer_status begin(uint16_t function, const trace_origin& origin, size_t bodySize,
                               std::byte** ppBody);
     trace_writer_status commit();
-    template <class T>
-    trace_writer_status append_fixed(uint16_t function, const trace_origin& origin, const T& body);
+    bool make_room(uint32_t uLength);
+    bool plan_room(uint64_t uLength, gap_plan* pPlan);
+    bool plan_grown_gap(uint64_t uNeeded, gap_plan* pPlan);
+    bool plan_head(uint64_t uNeeded, gap_plan* pPlan);
+    bool swallow(uint32_t* pEnd, uint32_t uLimit, gap_plan* pPlan);
+    void carry_out(const gap_plan& plan);
+    void move_to_head(const gap_plan& plan);
+    bool place(uint32_t uLength);
+    bool append_discard(uint32_t uLengthAfter);
+    uint32_t seq_number_from(uint32_t uAt) const;
+    bool reader_has_passed(uint32_t uSeqNumber) const;
+    void store_filler(uint32_t uAt, uint32_t uLength);
+    void swallow_first_filler();
+
+    // append.cpp: the bodies
+    template <class... T> trace_writer_status
+    append_fields(uint16_t function, const trace_origin& origin, const T&... fields);
+
+    // live.cpp: requests of a reader, and readers that died
+    void answer_reader();
+    void start_holding();
+    void publish_held();
+    bool place_held(uint32_t uLength);
+    void commit_held();
+    bool forget_dead_reader();
 
     std::byte* pMap = nullptr; ///< the mapped file; null without one
     uint32_t uSize = 0;        ///< of the file
     int fd = -1;
-    bool bAskLock = true;
+    bool bAskLock = true;      ///< forget readers that hold no lock any more
+    bool bDamaged = false;     ///< the ring was found overwritten
+    bool bFirstFiller = false; ///< the last filler of an empty ring still stands
 
-    uint32_t uArea = 0;    ///< offset of the record area
-    uint32_t uWrite = 0;   ///< where the next record goes
-    uint32_t uGapEnd = 0;  ///< where the gap, which begins at uWrite, ends
-    uint32_t uNextSeq = 0; ///< number of the next record
+    uint32_t uArea = 0;     ///< offset of the record area
+    uint32_t uWrite = 0;    ///< start of the gap = uOldestRecordOffset
+    uint32_t uGapEnd = 0;   ///< where the gap ends
+    uint32_t uNextSeq = 0;  ///< number of the next record
+    uint64_t uLastTime = 0; ///< time stamp of the newest record; fillers carry it
+    open_record current;
+
+    bool bHolding = false;    ///< uTailReq is raised and acknowledged
+    uint32_t uLastHeld = 0;   ///< offset of the last held record; 0: none
+    uint32_t uHeldEnd = 0;    ///< end of the chain = start of what is left of the gap
+    uint64_t uDropsDue = 0;   ///< drops that no record of kind 0xFFFE speaks for yet
+    trace_origin lastDropped; ///< origin of the latest of them; compId unused
+    uint64_t uNextAsk = 0;    ///< earliest time to ask for the lock, ms
+
     trace_writer_counts totals;
 };

@@ -1,0 +1,148 @@
+// The writer's answers to a reader that looks for its first record, and what is
+// appended meanwhile; readers that died.
+//
+// Held records stand in a chain behind the gap, which keeps 28 bytes. Their
+// function is 0xFFFF, which the reader's search skips; the real one waits in
+// `reserved`, and seqNumber holds the offset of the held record before it (0:
+// none), by which they are published from the last to the first: so a file
+// whose writer is killed in between has no 0xFFFF behind the first record.
+#include "trace_writer.h"
+
+#include "writer_words.h"
+
+#include <ctime>
+#include <fcntl.h>
+
+namespace {
+
+constexpr uint32_t MIN_RECORD = sizeof(trace_record_header);
+
+/// Between two questions for the lock, ms.
+constexpr uint64_t ASK_INTERVAL = 10;
+/// A reader that takes no lock gets this long to find its first record, ms.
+constexpr uint64_t ASK_AFTER_REQUEST = 200;
+
+uint64_t now_ms() {
+    timespec now{};
+    clock_gettime(CLOCK_MONOTONIC_COARSE, &now);
+    return static_cast<uint64_t>(now.tv_sec) * 1000 + static_cast<uint64_t>(now.tv_nsec) / 1000000;
+}
+
+} // namespace
+
+trace_writer_status trace_writer::poll() {
+    if (pMap == nullptr)
+        return TRACE_WRITER_INVALID;
+    answer_reader();
+    if (uDropsDue != 0 && !bDamaged && !append_discard(0) && forget_dead_reader()) {
+        answer_reader();
+        append_discard(0);
+    }
+    return bDamaged ? TRACE_WRITER_DAMAGED : TRACE_WRITER_OK;
+}
+
+void trace_writer::answer_reader() {
+    uint32_t uTailReq = shared_tail_request(pMap).load(std::memory_order_acquire);
+    if (uTailReq == 0 && !bHolding) [[likely]]
+        return;
+    if (!bHolding)
+        start_holding();
+    if (uTailReq != 0 && forget_dead_reader())
+        uTailReq = shared_tail_request(pMap).load(std::memory_order_acquire);
+    if (uTailReq != 0)
+        return;
+    // A reader that raises the word from now on must not find the old answer:
+    // either it sees the bit cleared, or its request is seen here.
+    shared_flags(pMap).fetch_and(static_cast<uint16_t>(~TRC_FLAG_TAIL_ACK));
+    std::atomic_thread_fence(std::memory_order_seq_cst);
+    if (shared_tail_request(pMap).load() != 0)
+        shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK);
+    else
+        publish_held();
+}
+
+void trace_writer::start_holding() {
+    bHolding = true;
+    uLastHeld = 0;
+    uHeldEnd = uWrite + MIN_RECORD;
+    uNextAsk = now_ms() + ASK_AFTER_REQUEST;
+    shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK);
+}
+
+/// The place of a held record, and the rest of the gap behind it.
+bool trace_writer::place_held(uint32_t uLength) {
+    const uint64_t uNeeded = uint64_t{uLength} + MIN_RECORD;
+    if (uHeldEnd > uGapEnd || uGapEnd - uHeldEnd < uNeeded)
+        return false;
+    current.uAt = uHeldEnd;
+    current.uOldest = uHeldEnd + uLength;
+    current.uGapEnd = uGapEnd;
+    store_filler(current.uOldest, uGapEnd - current.uOldest);
+    return true;
+}
+
+void trace_writer::commit_held() {
+    current.header.reserved = current.header.function;
+    current.header.function = TRC_FUNC_WRITING;
+    current.header.seqNumber = uLastHeld;
+    const auto words = std::bit_cast<header_words>(current.header);
+    const uint32_t uAt = current.uAt;
+    for (size_t i = WORD_SEQ_NUMBER; i < words.size(); ++i)
+        shared<uint32_t>(pMap, uAt + i * sizeof(uint32_t))
+            .store(words[i], std::memory_order_relaxed);
+    shared_word_of(pMap, uAt, WORD_LENGTH).store(words[WORD_LENGTH], std::memory_order_release);
+    shared_word_of(pMap, uAt, WORD_FUNCTION).store(words[WORD_FUNCTION], std::memory_order_release);
+    if (uLastHeld == 0) // the chain begins: the gap lets it be seen
+        shared_word_of(pMap, uWrite, WORD_LENGTH).store(MIN_RECORD, std::memory_order_release);
+    uLastHeld = uAt;
+    uHeldEnd = current.uOldest;
+    ++totals.uHeld;
+}
+
+void trace_writer::publish_held() {
+    bHolding = false;
+    if (uLastHeld == 0)
+        return;
+    uint32_t uSeqNumber = uNextSeq + 2 * static_cast<uint32_t>(totals.uHeld);
+    uNextSeq = uSeqNumber;
+    for (uint32_t uAt = uLastHeld; uAt != 0;) {
+        const trace_record_header header = own_header(pMap, uAt);
+        uSeqNumber -= 2;
+        shared_word_of(pMap, uAt, WORD_SEQ_NUMBER).store(uSeqNumber, std::memory_order_relaxed);
+        shared_word_of(pMap, uAt, WORD_FUNCTION)
+            .store(function_word(header.reserved), std::memory_order_release);
+        uAt = header.seqNumber;
+    }
+    uWrite = uHeldEnd;
+    swallow_first_filler();
+    shared_oldest(pMap).store(uWrite, std::memory_order_release);
+    totals.uAppended += totals.uHeld;
+    totals.uHeld = 0;
+    uLastHeld = 0;
+}
+
+/// Resets the reader's words if it stands in the way and nobody holds a lock.
+/// True when it did. Only the values seen before the question are reset: a
+/// reader that comes just now stores others, or at least waits 10 ms before it
+/// looks at the ring.
+bool trace_writer::forget_dead_reader() {
+    if (!bAskLock)
+        return false;
+    const uint64_t uNow = now_ms();
+    if (uNow < uNextAsk)
+        return false;
+    uint32_t uTailReq = shared_tail_request(pMap).load(std::memory_order_acquire);
+    uint32_t uSeqLock = shared_seq_lock(pMap).load(std::memory_order_acquire);
+    if (uTailReq == 0 && uSeqLock == TRC_SEQ_NO_READER)
+        return false;
+    uNextAsk = uNow + ASK_INTERVAL;
+    struct flock lock {};
+    lock.l_type = F_WRLCK;
+    lock.l_whence = SEEK_SET;
+    if (fcntl(fd, F_GETLK, &lock) != 0 || lock.l_type != F_UNLCK)
+        return false;
+    shared_seq_lock(pMap).compare_exchange_strong(uSeqLock, TRC_SEQ_NO_READER);
+    if (uTailReq != 0)
+        shared_tail_request(pMap).compare_exchange_strong(uTailReq, 0);
+    return true;
+}
