@@ -1,0 +1,230 @@
+#include "walk.h"
+
+#include "first_record.h"
+#include "memory_trace.h"
+#include "start.h"
+
+#include <gtest/gtest.h>
+
+using testing::internal::CaptureStderr;
+using testing::internal::GetCapturedStderr;
+
+namespace {
+
+const std::string GIVING_UP =
+    "WARNING: Irrecoverable corruption detected (giving up on the rest of this file): ";
+
+/// What is_last_record says at the position, and what it writes.
+std::pair<walk_result, std::string> ask(memory_trace& trace, uint64_t uOffset) {
+    trace_record_header header;
+    CaptureStderr();
+    const walk_result result = is_last_record(&trace.stand_on(uOffset).file, &header);
+    return {result, GetCapturedStderr()};
+}
+
+std::pair<walk_result, std::string> step(memory_trace& trace) {
+    CaptureStderr();
+    const walk_result result = get_next_record(&trace.file);
+    return {result, GetCapturedStderr()};
+}
+
+using answer = std::pair<walk_result, std::string>;
+
+TEST(Walk, judges_records_by_function_component_and_length) {
+    const struct {
+        raw_record record;
+        const char* pWarning;
+    } cases[] = {
+        {{.function = 18},
+         "invalid record function type: file(ring.trc) "
+         "record_offset(0x000000c8) function(18).\n"},
+        {{.function = 20, .compId = "", .length = 0},
+         "invalid record function type: file(ring.trc) record_offset(0x000000c8) "
+         "function(20).\n"},
+        {{.function = 0xFFFD},
+         "invalid record function type: file(ring.trc) "
+         "record_offset(0x000000c8) function(65533).\n"},
+        {{.function = 0xFFFF},
+         "invalid record function type: file(ring.trc) "
+         "record_offset(0x000000c8) function(65535).\n"},
+        {{.function = 1, .compId = "A\tB\x7F", .length = 0},
+         "invalid record compId: file(ring.trc) record_offset(0x000000c8) "
+         "compId[0-3][0x419427f])\n"},
+        {{.function = 16, .compId = "\xFF"},
+         "invalid record compId: file(ring.trc) record_offset(0x000000c8) "
+         "compId[0-3][0xff000])\n"},
+        {{.function = 1, .length = 27},
+         "invalid record length: file(ring.trc) record_offset(0x000000c8) length(27).\n"},
+        {{.function = 0, .compId = "", .length = 0},
+         "invalid record length: file(ring.trc) record_offset(0x000000c8) length(0).\n"},
+        {{.function = 1, .compId = " ~_9"}, nullptr},
+        {{.function = 0, .compId = ""}, nullptr},
+        {{.function = 17, .compId = ""}, nullptr},
+        {{.function = 19, .compId = ""}, nullptr},
+        {{.function = 0xFFFE, .compId = ""}, nullptr},
+    };
+    for (const auto& test : cases) {
+        raw_trace raw(300);
+        raw.put(200, test.record);
+        raw.header.uSeqLock = 0;
+        memory_trace trace(raw);
+        const answer expected = test.pWarning != nullptr
+                                    ? answer{WALK_CORRUPT, GIVING_UP + test.pWarning}
+                                    : answer{WALK_RECORD, ""};
+        EXPECT_EQ(ask(trace, 200), expected) << test.record.function;
+    }
+}
+
+TEST(Walk, positions_without_a_whole_header_are_out_of_bounds) {
+    raw_trace raw(300);
+    raw.put(200, {.seqNumber = 2});
+    for (const uint64_t uOffset : {0ULL, 199ULL, 273ULL, 300ULL, 301ULL, 0x1'0000'00C8ULL, ~0ULL}) {
+        memory_trace trace(raw);
+        EXPECT_EQ(ask(trace, uOffset),
+                  (answer{WALK_CORRUPT, out_of_bounds_warning(trace.file, uOffset)}));
+    }
+    raw.header.uSeqLock = 2;
+    for (const uint32_t uOldest : {0U, 199U, 273U, 300U, 0xFFFFFFFFU}) {
+        raw.header.uOldestRecordOffset = uOldest;
+        memory_trace trace(raw);
+        EXPECT_EQ(ask(trace, 200),
+                  (answer{WALK_CORRUPT, out_of_bounds_warning(trace.file, uOldest)}));
+    }
+}
+
+TEST(Walk, knows_that_it_has_caught_up_and_says_when_the_ring_is_inconsistent) {
+    raw_trace raw(400);
+    raw.header.uSeqLock = 10;
+    raw.add({.seqNumber = 10, .body = std::vector<std::byte>(4)});
+    raw.add({.seqNumber = 12, .body = std::vector<std::byte>(4)});
+    raw.add_rest();
+    memory_trace trace(raw);
+    trace_file_header& header = *trace.file.pHeader;
+    EXPECT_EQ(ask(trace, 200), (answer{WALK_RECORD, ""})) << "the next one in sequence";
+    header.uSeqLock = 8;
+    EXPECT_EQ(ask(trace, 200), (answer{WALK_NO_RECORD, ""})) << "another one";
+    EXPECT_EQ(ask(trace, 232), (answer{WALK_RECORD, ""})) << "not on the oldest position";
+
+    header.uActualFileSize = 231;
+    EXPECT_EQ(ask(trace, 232), (answer{WALK_NO_RECORD, "Bad trace file, last record extends beyond "
+                                                       "end of file, offset = 232 (0xe8).\n"}));
+    header.uActualFileSize = 232;
+    EXPECT_EQ(ask(trace, 232), (answer{WALK_RECORD, ""}));
+
+    header.uOldestRecordOffset = 263;
+    EXPECT_EQ(ask(trace, 232),
+              (answer{WALK_NO_RECORD,
+                      "Bad trace file, last record length is not correct. offset=232 (0xe8), "
+                      "length=32, function=1, seqNumber=12 (0xc)\n"}));
+    EXPECT_EQ(step(trace).first, WALK_NO_RECORD);
+    EXPECT_EQ(trace.offset(), 232U) << "no step";
+    header.uOldestRecordOffset = 264;
+    EXPECT_EQ(ask(trace, 232), (answer{WALK_RECORD, ""}));
+}
+
+TEST(Walk, steps_round_the_end_and_counts_what_takes_part_in_the_sequence) {
+    raw_trace raw(400);
+    raw.header.uSeqLock = 4092;
+    raw.header.uOldestRecordOffset = 340;
+    raw.put(200, {.function = 1, .seqNumber = 7, .length = 140});
+    raw.put(340, {.function = 0, .seqNumber = 4092, .length = 60});
+    memory_trace trace(raw);
+    const auto walk = [&trace](uint64_t uOffset) {
+        const answer result = step(trace.stand_on(uOffset));
+        EXPECT_EQ(result, (answer{WALK_RECORD, ""}));
+        return std::pair{trace.offset(), trace.file.pHeader->uSeqLock};
+    };
+    EXPECT_EQ(walk(340), (std::pair{uint64_t{200}, 4094U})) << "ends exactly at the end";
+    EXPECT_EQ(walk(200), (std::pair{uint64_t{340}, 4096U}));
+
+    trace.file.pHeader->uSeqLock = TRC_SEQ_FILLER;
+    trace.put(340, {.function = 0, .seqNumber = TRC_SEQ_FILLER, .length = 60});
+    EXPECT_EQ(walk(340), (std::pair{uint64_t{200}, TRC_SEQ_FILLER})) << "does not count";
+
+    for (const int64_t iLength : {61LL, 0xFFFFFF00LL, 0xFFFFFFFFLL}) {
+        trace.file.pHeader->uSeqLock = 2;
+        trace.put(340, {.seqNumber = 2, .length = iLength});
+        const uint64_t uNext = 340 + static_cast<uint64_t>(iLength);
+        EXPECT_EQ(step(trace.stand_on(340)),
+                  (answer{WALK_CORRUPT, out_of_bounds_warning(trace.file, uNext)}));
+        EXPECT_EQ(trace.file.pHeader->uSeqLock, 2U) << "not passed";
+    }
+    EXPECT_EQ(record_bytes(&trace.file, ring_position(&trace.file, 340), 0xFFFFFFFF).size(), 60U);
+    EXPECT_EQ(record_bytes(&trace.file, trace.file.pMapEnd, 28).size(), 0U);
+}
+
+TEST(Walk, ends_on_a_ring_of_fillers_and_notices_a_writer_that_goes_on) {
+    raw_trace raw(400);
+    raw.add_filler(100);
+    raw.add_filler(100);
+    for (const bool bMovesOldest : {false, true}) {
+        memory_trace trace(raw);
+        ASSERT_EQ(find_first_record(&trace.file), 0);
+        EXPECT_EQ(trace.offset(), 200U);
+        int iSteps = 0;
+        while (iSteps < 10 && get_next_record(&trace.file) == WALK_RECORD)
+            ++iSteps;
+        EXPECT_EQ(iSteps, 2) << "one turn";
+        EXPECT_EQ(ask(trace, 200), (answer{WALK_NO_RECORD, ""})) << "still the same";
+        if (bMovesOldest) { // the record goes behind what stands here
+            trace.put(300, {.seqNumber = TRC_SEQ_FILLER, .length = 100});
+            trace.file.pHeader->uOldestRecordOffset = 300;
+            EXPECT_EQ(step(trace), (answer{WALK_RECORD, ""}));
+        } else {
+            trace.put(200, {.seqNumber = TRC_SEQ_FILLER, .length = 100});
+        }
+        EXPECT_EQ(step(trace), (answer{WALK_RECORD, ""}));
+        EXPECT_EQ(trace.file.pHeader->uSeqLock, TRC_SEQ_FILLER + 2);
+        EXPECT_EQ(trace.file.uUncountedBytes, 0U);
+    }
+}
+
+/// Everything that a reader task does with a file. Returns the steps it took.
+uint64_t read_to_the_end(trace_file& file) {
+    cu_nanoseconds time;
+    oldest_record_time(&file, &time);
+    uint64_t uSteps = 0;
+    trace_record_header header;
+    if (find_first_record(&file) != 0 || set_file_start(&file) != 0)
+        return 0;
+    while (is_last_record(&file, &header) == WALK_RECORD) {
+        record_bytes(&file, file.pCurRec, header.length);
+        start_is_reached(&file, header);
+        if (step_to_next_record(&file, header) != WALK_RECORD)
+            break;
+        ++uSteps;
+    }
+    return uSteps;
+}
+
+TEST(Walk, stays_inside_any_file_and_comes_to_an_end) {
+    constexpr uint32_t SIZE = 400;
+    const int64_t lengths[] = {0, 1, 27, 28, 60, 100, 171, 172, 200, 0x7FFFFFFF, 0xFFFFFFFF};
+    const uint32_t positions[] = {0, 4, 199, 200, 203, 228, 260, 372, 373, 400, 0xFFFFFFFF};
+    const uint16_t kinds[] = {0, 1, 16, 0xFFFE, 0xFFFF};
+    CaptureStderr();
+    for (const int64_t iLength : lengths)
+        for (const int64_t iSecond : lengths)
+            for (const uint16_t uKind : kinds)
+                for (const uint32_t uOldest : positions)
+                    for (const uint32_t uOffset : positions) {
+                        raw_trace raw(SIZE);
+                        raw.put(
+                            200,
+                            {.function = uKind, .seqNumber = TRC_SEQ_FILLER, .length = iLength});
+                        raw.put(
+                            260,
+                            {.function = uKind, .seqNumber = TRC_SEQ_FILLER, .length = iSecond});
+                        raw.header.uOldestRecordOffset = uOldest;
+                        raw.header.uOffset = uOffset;
+                        memory_trace trace(raw);
+                        anchor.startOptions = static_cast<int32_t>((uOldest + uOffset) % 6);
+                        ASSERT_LE(read_to_the_end(trace.file), 2 * SIZE / 28)
+                            << iLength << ' ' << iSecond << ' ' << uKind << ' ' << uOldest << ' '
+                            << uOffset;
+                    }
+    anchor.startOptions = START_NONE;
+    GetCapturedStderr();
+}
+
+} // namespace
