@@ -1,6 +1,7 @@
 #include "cleanup.h"
 
 #include "kelvo.h"
+#include "open.h"
 #include "options.h"
 #include "store.h"
 
@@ -10,13 +11,15 @@ std::atomic<bool> bReadersMayRun{false};
 
 namespace {
 
-/// The files themselves were closed by their readers.
+/// The files themselves were closed by their readers. One whose task was dropped
+/// with the pool is still mapped: the mapping goes with the process.
 void release_files() {
     while (anchor.pFirstFile != nullptr) {
         trace_file* const pTraceFile = anchor.pFirstFile;
         anchor.pFirstFile = pTraceFile->pNext;
-        pthread_mutex_destroy(&pTraceFile->queueMutex);
-        free(pTraceFile);
+        if (pTraceFile->pMapEnd != nullptr)
+            pTraceFile->pHeader = nullptr;
+        release_trace_file(pTraceFile);
     }
     anchor.iNumberFiles = 0;
 }

@@ -56,10 +56,6 @@ void handle_terminating_signal(int signo) {
     if (bMainThreadWaits)
         jump_to_end(signo);
     iPendingSignal = signo;
-    // The write that SIGTTOU interrupted is repeated, and would only raise it
-    // again; ignored, the signal lets the write pass.
-    if (signo == SIGTTOU)
-        signal(SIGTTOU, SIG_IGN);
 }
 
 /// Lets the signal have the effect that it had before the run: a fault recurs

@@ -1,0 +1,252 @@
+#include "run_command.h"
+
+#include <array>
+#include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <cstdlib>
+#include <fcntl.h>
+#include <poll.h>
+#include <string_view>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+/// Variables of the tester's environment that would change the result.
+constexpr std::string_view DROPPED_PREFIXES[] = {
+    "LC_",
+    "LANG",
+    "TZ=",
+    "NLSPATH=",
+    "KV_TR_TEMPLATE_PATH=",
+    "KELVO_USE_LOWMEM=",
+    "POSIXLY_CORRECT=",
+};
+
+int64_t now_ms() {
+    using namespace std::chrono;
+    return duration_cast<milliseconds>(steady_clock::now().time_since_epoch()).count();
+}
+
+bool is_dropped(std::string_view sVariable) {
+    for (const std::string_view sPrefix : DROPPED_PREFIXES)
+        if (sVariable.starts_with(sPrefix))
+            return true;
+    return false;
+}
+
+/// A later variable of the same name wins.
+std::vector<std::string> make_environment(const command_setup& setup) {
+    std::vector<std::string> result;
+    const auto set = [&result](std::string_view sVariable) {
+        const std::string_view sName = sVariable.substr(0, sVariable.find('=') + 1);
+        std::erase_if(result, [&](const std::string& sOld) { return sOld.starts_with(sName); });
+        result.emplace_back(sVariable);
+    };
+    for (char** ppVariable = environ; *ppVariable != nullptr; ++ppVariable)
+        if (!is_dropped(*ppVariable))
+            result.emplace_back(*ppVariable);
+    set("LC_ALL=C");
+    set("TZ=UTC0");
+    for (const std::string& sVariable : setup.environment)
+        set(sVariable);
+    return result;
+}
+
+std::vector<char*> pointers(std::vector<std::string>& texts) {
+    std::vector<char*> result;
+    for (std::string& sText : texts)
+        result.push_back(sText.data());
+    result.push_back(nullptr);
+    return result;
+}
+
+struct pipe_ends {
+    int read = -1;
+    int write = -1;
+};
+
+pipe_ends make_pipe() {
+    int fds[2];
+    if (pipe2(fds, O_CLOEXEC) != 0) {
+        ADD_FAILURE() << "pipe2: " << errno;
+        return {};
+    }
+    fcntl(fds[0], F_SETFL, O_NONBLOCK);
+    return {fds[0], fds[1]};
+}
+
+void close_fd(int& fd) {
+    if (fd >= 0)
+        close(fd);
+    fd = -1;
+}
+
+/// In the child: system calls only.
+[[noreturn]] void become_program(const command_setup& setup, char** argv, char** envp, int outFd,
+                                 int errFd) {
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    sigset_t none;
+    sigemptyset(&none);
+    sigprocmask(SIG_SETMASK, &none, nullptr);
+    signal(SIGPIPE, SIG_DFL);
+    const int inFd = open("/dev/null", O_RDONLY);
+    if (!setup.sStdout.empty())
+        outFd = open(setup.sStdout.c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
+    dup2(inFd, STDIN_FILENO);
+    dup2(outFd, STDOUT_FILENO);
+    dup2(errFd, STDERR_FILENO);
+    if (setup.bStdoutClosed)
+        close(STDOUT_FILENO);
+    if (setup.sDirectory.empty() || chdir(setup.sDirectory.c_str()) == 0)
+        execve(argv[0], argv, envp);
+    _exit(127);
+}
+
+} // namespace
+
+live_command::live_command(const std::vector<std::string>& arguments, const command_setup& setup)
+    : m_sName(setup.sProgram), m_timeoutSeconds(setup.timeoutSeconds) {
+    std::vector<std::string> words{setup.sProgram};
+    for (const std::string& sArgument : arguments) {
+        words.push_back(sArgument);
+        m_sName += ' ' + sArgument;
+    }
+    std::vector<std::string> environment = make_environment(setup);
+    const std::vector<char*> argv = pointers(words);
+    const std::vector<char*> envp = pointers(environment);
+    pipe_ends out = make_pipe();
+    pipe_ends err = make_pipe();
+
+    m_pid = fork();
+    if (m_pid == 0)
+        become_program(setup, const_cast<char**>(argv.data()), const_cast<char**>(envp.data()),
+                       out.write, err.write);
+    if (m_pid < 0)
+        ADD_FAILURE() << "fork: " << errno;
+    close_fd(out.write);
+    close_fd(err.write);
+    m_out.fd = out.read;
+    m_err.fd = err.read;
+}
+
+live_command::~live_command() {
+    if (m_pid > 0) {
+        kill(m_pid, SIGKILL);
+        waitpid(m_pid, nullptr, 0);
+    }
+    close_fd(m_out.fd);
+    close_fd(m_err.fd);
+}
+
+void live_command::give_up(const char* pWhat) {
+    ADD_FAILURE() << pWhat << ": " << m_sName << "\nstandard output: " << m_out.sText
+                  << "\nstandard error: " << m_err.sText;
+    if (m_pid > 0)
+        kill(m_pid, SIGKILL);
+    close_fd(m_out.fd);
+    close_fd(m_err.fd);
+}
+
+/// Takes in what the program writes next. Returns false when both streams have
+/// ended or the deadline has passed (the program is then killed).
+bool live_command::receive(int64_t iDeadline) {
+    std::array<stream*, 2> streams{&m_out, &m_err};
+    std::array<pollfd, 2> fds{pollfd{m_out.fd, POLLIN, 0}, pollfd{m_err.fd, POLLIN, 0}};
+    if (m_out.fd < 0 && m_err.fd < 0)
+        return false;
+    const int64_t iLeft = iDeadline - now_ms();
+    if (iLeft <= 0 || poll(fds.data(), fds.size(), static_cast<int>(iLeft)) == 0) {
+        give_up("timed out");
+        return false;
+    }
+    for (size_t i = 0; i < streams.size(); ++i) {
+        if (fds[i].revents == 0)
+            continue;
+        char buffer[65536];
+        const ssize_t length = read(fds[i].fd, buffer, sizeof buffer);
+        if (length > 0)
+            streams[i]->sText.append(buffer, static_cast<size_t>(length));
+        else if (length == 0 || errno != EAGAIN)
+            close_fd(streams[i]->fd);
+    }
+    return true;
+}
+
+std::string live_command::read_line() {
+    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    size_t uEnd;
+    while ((uEnd = m_out.sText.find('\n')) == std::string::npos && m_out.fd >= 0)
+        receive(iDeadline);
+    const std::string sLine = m_out.sText.substr(0, uEnd);
+    m_out.sText.erase(0, uEnd == std::string::npos ? uEnd : uEnd + 1);
+    return sLine;
+}
+
+std::string live_command::read_line_with(const std::string& sText) {
+    while (m_out.fd >= 0 || !m_out.sText.empty()) {
+        std::string sLine = read_line();
+        if (sLine.find(sText) != std::string::npos)
+            return sLine;
+    }
+    ADD_FAILURE() << "no line with \"" << sText << "\": " << m_sName
+                  << "\nstandard error: " << m_err.sText;
+    return "";
+}
+
+void live_command::wait_for_error(const std::string& sText) {
+    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    while (m_err.sText.find(sText) == std::string::npos) {
+        if (m_err.fd < 0) {
+            ADD_FAILURE() << "standard error has no \"" << sText << "\": " << m_sName << '\n'
+                          << m_err.sText;
+            return;
+        }
+        receive(iDeadline);
+    }
+}
+
+void live_command::send_signal(int signo) const {
+    EXPECT_EQ(kill(m_pid, signo), 0);
+}
+
+void live_command::close_output() {
+    close_fd(m_out.fd);
+}
+
+/// Collects the end of the program, which has closed its streams.
+void live_command::reap(int64_t iDeadline) {
+    int state = 0;
+    while (waitpid(m_pid, &state, WNOHANG) == 0) {
+        if (now_ms() > iDeadline) {
+            give_up("did not end");
+            waitpid(m_pid, &state, 0);
+            break;
+        }
+        usleep(1000);
+    }
+    m_pid = -1;
+    if (WIFEXITED(state))
+        m_result.status = WEXITSTATUS(state);
+    if (WIFSIGNALED(state))
+        m_result.signo = WTERMSIG(state);
+}
+
+command_result live_command::wait() {
+    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    while (receive(iDeadline)) {
+    }
+    if (m_pid > 0)
+        reap(iDeadline);
+    m_result.sOut = std::move(m_out.sText);
+    m_result.sErr = std::move(m_err.sText);
+    return m_result;
+}
+
+command_result run_command(const std::vector<std::string>& arguments, const command_setup& setup) {
+    return live_command(arguments, setup).wait();
+}

@@ -1,0 +1,260 @@
+// The pool never opens again once it is closed, so each case runs in a process
+// of its own; what it writes to standard error is read back through a file.
+#include "pool.h"
+
+#include "kelvo.h"
+
+#include <array>
+#include <cerrno>
+#include <condition_variable>
+#include <cstdio>
+#include <cstdlib>
+#include <mutex>
+#include <string>
+#include <unistd.h>
+#include <vector>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+using testing::HasSubstr;
+
+namespace {
+
+std::atomic<int> iThreadsAllowed{1000000};
+
+} // namespace
+
+extern "C" {
+int __real_pthread_create(pthread_t*, const pthread_attr_t*, void* (*)(void*), void*);
+
+int __wrap_pthread_create(pthread_t* pId, const pthread_attr_t* pAttributes, void* (*pBody)(void*),
+                          void* pArgument) {
+    if (iThreadsAllowed.fetch_sub(1) <= 0)
+        return EAGAIN;
+    return __real_pthread_create(pId, pAttributes, pBody, pArgument);
+}
+}
+
+namespace {
+
+/// Runs `body` in a fresh process and fails with it.
+#define IN_OWN_PROCESS(body)                                                                       \
+    do {                                                                                           \
+        GTEST_FLAG_SET(death_test_style, "threadsafe");                                            \
+        EXPECT_EXIT(                                                                               \
+            {                                                                                      \
+                body();                                                                            \
+                exit(testing::Test::HasFailure() ? 1 : 0);                                         \
+            },                                                                                     \
+            testing::ExitedWithCode(0), "");                                                       \
+    } while (0)
+
+/// A task that notes its arrival and then stays until the gate is opened.
+struct gate_t {
+    std::mutex mutex;
+    std::condition_variable changed;
+    std::vector<void*> entered;
+    bool bOpen = false;
+    bool bAsynchronousBlocked = true;
+
+    void pass(void* pTask) {
+        sigset_t mask;
+        pthread_sigmask(SIG_BLOCK, nullptr, &mask);
+        std::unique_lock lock(mutex);
+        bAsynchronousBlocked &= sigismember(&mask, SIGINT) == 1 && sigismember(&mask, SIGPIPE) == 0;
+        entered.push_back(pTask);
+        changed.notify_all();
+        changed.wait(lock, [this] { return bOpen; });
+    }
+    void wait_for_entered(size_t uCount) {
+        std::unique_lock lock(mutex);
+        changed.wait(lock, [&] { return entered.size() >= uCount; });
+    }
+    void open() {
+        const std::lock_guard lock(mutex);
+        bOpen = true;
+        changed.notify_all();
+    }
+};
+
+gate_t gate;
+
+void* pass_gate(void* pTask) {
+    gate.pass(pTask);
+    return nullptr;
+}
+
+/// Standard error goes to a file while the object lives.
+class stderr_file {
+public:
+    stderr_file() : m_saved(dup(STDERR_FILENO)) {
+        dup2(fileno(m_pFile), STDERR_FILENO);
+    }
+    ~stderr_file() {
+        dup2(m_saved, STDERR_FILENO);
+        close(m_saved);
+        fclose(m_pFile);
+    }
+    stderr_file(const stderr_file&) = delete;
+    stderr_file& operator=(const stderr_file&) = delete;
+
+    std::string text() const {
+        std::string sText(65536, '\0');
+        const ssize_t length = pread(fileno(m_pFile), sText.data(), sText.size(), 0);
+        sText.resize(length > 0 ? static_cast<size_t>(length) : 0);
+        return sText;
+    }
+
+private:
+    FILE* m_pFile = tmpfile();
+    int m_saved;
+};
+
+std::array<std::atomic<pthread_t>, 64> ids;
+std::array<int, 64> tasks;
+
+int add_task(size_t uTask) {
+    return poolAddNewTask(&ids[uTask], &tasks[uTask]);
+}
+
+void start_pool() {
+    pool_task_main = pass_gate;
+    anchor.pProgName = "kelvo";
+    ASSERT_EQ(startNewThreadPool(), 0);
+}
+
+void grows_when_fewer_than_three_are_free() {
+    const stderr_file errors;
+    memory_is_restricted = 1;
+    start_pool();
+    for (size_t uTask = 0; uTask < 14; ++uTask) {
+        ASSERT_EQ(add_task(uTask), 0);
+        gate.wait_for_entered(uTask + 1);
+    }
+    EXPECT_EQ(errors.text(), "[POOL]Total: 000000    Free: 000000 |  Adding Threads\n"
+                             "[POOL] Total: 000016    Free: 000016 |  Aifter adding Threads\n");
+    ASSERT_EQ(add_task(14), 0);
+    gate.wait_for_entered(15);
+    EXPECT_THAT(
+        errors.text(),
+        testing::EndsWith("[POOL]Total: 000016    Free: 000002 |  Adding Threads\n"
+                          "[POOL] Total: 000020    Free: 000006 |  Aifter adding Threads\n"));
+    EXPECT_TRUE(gate.bAsynchronousBlocked);
+    EXPECT_NE(ids[14].load(), 0U);
+
+    sigset_t mask;
+    pthread_sigmask(SIG_BLOCK, nullptr, &mask);
+    EXPECT_EQ(sigismember(&mask, SIGINT), 0) << "the creator's own mask is open again";
+
+    gate.open();
+    EXPECT_TRUE(endThrdPool());
+    EXPECT_EQ(ids[14].load(), 0U);
+    EXPECT_EQ(totalFreeThrdsInPool.load(), 0U);
+}
+
+TEST(Pool, GrowsWhenFewerThanThreeAreFree) {
+    IN_OWN_PROCESS(grows_when_fewer_than_three_are_free);
+}
+
+/// With one thread in all, tasks cannot overtake one another.
+void runs_tasks_in_order() {
+    const stderr_file errors;
+    iThreadsAllowed = 1;
+    start_pool();
+    EXPECT_EQ(totalThrdsInPool.load(), 1U);
+    iThreadsAllowed = 0;
+    EXPECT_EQ(add_task(0), -1) << "refused although a thread is free";
+    EXPECT_THAT(errors.text(),
+                HasSubstr("WARNING: Insufficient memory (size=0) to process: pthread_create\n"));
+
+    totalFreeThrdsInPool += 60; // so that nothing is added from here on
+    gate.open();
+    std::vector<void*> expected;
+    for (size_t uTask = 0; uTask < tasks.size(); ++uTask) {
+        ASSERT_EQ(add_task(uTask), 0);
+        expected.push_back(&tasks[uTask]);
+    }
+    gate.wait_for_entered(tasks.size());
+    EXPECT_EQ(gate.entered, expected);
+    EXPECT_TRUE(endThrdPool());
+}
+
+TEST(Pool, RunsTasksInOrder) {
+    IN_OWN_PROCESS(runs_tasks_in_order);
+}
+
+void closing_drops_what_has_not_begun() {
+    const stderr_file errors;
+    iThreadsAllowed = 3;
+    start_pool();
+    totalFreeThrdsInPool += 60; // nothing is added: three tasks run, the others wait
+    for (size_t uTask = 0; uTask < 10; ++uTask)
+        ASSERT_EQ(add_task(uTask), 0);
+    gate.wait_for_entered(3);
+
+    EXPECT_FALSE(endThrdPool()) << "three tasks still run";
+    EXPECT_EQ(add_task(10), -1);
+    totalFreeThrdsInPool = 0;
+    iThreadsAllowed = 100;
+    EXPECT_EQ(add_task(10), -1);
+    EXPECT_EQ(totalThrdsInPool.load(), 3U) << "a closed pool does not grow";
+
+    gate.open();
+    while (!endThrdPool()) {
+    }
+    EXPECT_EQ(gate.entered.size(), 3U);
+}
+
+TEST(Pool, ClosingDropsWhatHasNotBegun) {
+    IN_OWN_PROCESS(closing_drops_what_has_not_begun);
+}
+
+void no_thread_at_all() {
+    const stderr_file errors;
+    iThreadsAllowed = 0;
+    EXPECT_EQ(startNewThreadPool(), -1);
+    EXPECT_TRUE(endThrdPool());
+}
+
+TEST(Pool, StartFailsWithoutAnyThread) {
+    IN_OWN_PROCESS(no_thread_at_all);
+}
+
+void never_started() {
+    EXPECT_TRUE(endThrdPool());
+    EXPECT_TRUE(endThrdPool());
+}
+
+TEST(Pool, EndIsHarmlessWhenNeverStarted) {
+    IN_OWN_PROCESS(never_started);
+}
+
+/// Every task runs exactly once while several threads add tasks, among them
+/// pool threads, as readers do.
+std::atomic<int> iRuns{0};
+
+void* add_next_task(void* pTask) {
+    const size_t uTask = static_cast<size_t>(static_cast<int*>(pTask) - tasks.data());
+    ++iRuns;
+    if (uTask + 8 < tasks.size() && add_task(uTask + 8) != 0)
+        abort();
+    return nullptr;
+}
+
+void tasks_add_tasks() {
+    start_pool();
+    pool_task_main = add_next_task;
+    for (size_t uTask = 0; uTask < 8; ++uTask)
+        ASSERT_EQ(add_task(uTask), 0);
+    while (static_cast<size_t>(iRuns.load()) < tasks.size())
+        usleep(100);
+    EXPECT_TRUE(endThrdPool());
+    EXPECT_EQ(static_cast<size_t>(iRuns.load()), tasks.size());
+}
+
+TEST(Pool, TasksMayAddTasks) {
+    IN_OWN_PROCESS(tasks_add_tasks);
+}
+
+} // namespace
