@@ -1,0 +1,159 @@
+#include "frame.h"
+
+#include "digits.h"
+#include "stdout_stream.h"
+#include "time_text.h"
+
+#include <algorithm>
+#include <cstring>
+
+namespace {
+
+// What the fields of a prefix are made from.
+struct prefix_source {
+    timespec time;
+    uint64_t threadId;
+    const char* pCompId;
+    uint32_t funcId;
+    uint32_t seqNumber;
+    uint32_t offset;
+};
+
+// Most bytes of one field: a date or time of up to 39 and the nanoseconds.
+constexpr size_t FIELD_ROOM = 64;
+constexpr size_t PREFIX_ROOM = FIELD_ROOM * sizeof anchor.outputOptions;
+
+char* put_text(char* pOut, std::string_view text) {
+    return std::copy(text.begin(), text.end(), pOut);
+}
+
+char* put_date(char* pOut, const prefix_source& source) {
+    return put_text(pOut, date_text(source.time.tv_sec));
+}
+
+char* put_time(char* pOut, const prefix_source& source) {
+    pOut = put_text(pOut, time_of_day_text(source.time.tv_sec));
+    *pOut++ = '.';
+    return put_nanoseconds(pOut, static_cast<uint32_t>(source.time.tv_nsec));
+}
+
+char* put_thread(char* pOut, const prefix_source& source) {
+    pOut = put_text(pOut, " T(");
+    pOut = put_number(pOut, source.threadId, 16, 3, ' ');
+    *pOut++ = ')';
+    return pOut;
+}
+
+// Four columns, right-aligned when a NUL ends the id early.
+char* put_component(char* pOut, const prefix_source& source) {
+    const std::string_view text(source.pCompId, strnlen(source.pCompId, 4));
+    pOut = std::fill_n(pOut, 1 + 4 - text.size(), ' ');
+    return put_text(pOut, text);
+}
+
+char* put_function(char* pOut, const prefix_source& source) {
+    *pOut++ = ' ';
+    return put_number(pOut, source.funcId, 10, 2, ' ');
+}
+
+char* put_sequence(char* pOut, const prefix_source& source) {
+    return put_hex8(put_text(pOut, " 0x"), source.seqNumber);
+}
+
+char* put_offset(char* pOut, const prefix_source& source) {
+    return put_hex8(put_text(pOut, " 0x"), source.offset);
+}
+
+// The fields by their -o letter. Each writes at most FIELD_ROOM bytes at `pOut`
+// and returns the position after them.
+struct prefix_field {
+    char letter;
+    char* (*pPut)(char* pOut, const prefix_source& source);
+};
+constexpr prefix_field PREFIX_FIELDS[] = {
+    {'d', put_date},     {'t', put_time},     {'i', put_thread}, {'c', put_component},
+    {'f', put_function}, {'s', put_sequence}, {'o', put_offset},
+};
+
+char* put_fields(char* pOut, const prefix_source& source) {
+    for (const char letter : anchor.outputOptions) {
+        if (letter == '\0')
+            break;
+        for (const prefix_field& field : PREFIX_FIELDS) {
+            if (field.letter == letter)
+                pOut = field.pPut(pOut, source);
+        }
+    }
+    return pOut;
+}
+
+// The file index counts as four columns, also where it takes more.
+constexpr int INDEX_COLUMNS = 4;
+
+void write_prefix(const trace_file* pTraceFile, const prefix_source& source) {
+    char prefix[PREFIX_ROOM];
+    char* pFields = prefix;
+    int columns = 0;
+    if (anchor.iNumberFiles > 1) {
+        *pFields++ = '[';
+        pFields = put_number(pFields, static_cast<uint64_t>(pTraceFile->index), 10, 2, '0');
+        *pFields++ = ']';
+        columns = INDEX_COLUMNS;
+    }
+    char* pEnd = put_fields(pFields, source);
+    columns += static_cast<int>(pEnd - pFields);
+    stdout_write({prefix, static_cast<size_t>(pEnd - prefix)});
+    anchor.curColumn = static_cast<int16_t>(columns);
+    anchor.headerIndent = static_cast<int16_t>(columns + 1);
+}
+
+void keep_latest_time(trace_file* pTraceFile, const timespec& time) {
+    const timespec& latest = pTraceFile->modTime;
+    if (time.tv_sec < latest.tv_sec ||
+        (time.tv_sec == latest.tv_sec && time.tv_nsec <= latest.tv_nsec))
+        return;
+    pTraceFile->modTime = time;
+    pTraceFile->timeStampIsValid = 1;
+}
+
+} // namespace
+
+int output_start_rec(trace_file* pTraceFile, const char* pCompId, uint64_t threadId,
+                     uint32_t funcId, uint32_t seqNumber, uint32_t offset, uint64_t timeStamp,
+                     const cu_timeinfo* pTimeInfo) {
+    output_abandon_rec();
+    thread_info* pThread = get_thread_info(pTraceFile, threadId);
+    if (pThread == nullptr)
+        return 1;
+    anchor.outputFlags |= OUTPUT_START_PENDING;
+    anchor.pCurFile = pTraceFile;
+    anchor.pCurThread = pThread;
+
+    prefix_source source{{}, threadId, pCompId, funcId, seqNumber, offset};
+    cu_cvt_time_platform_1(timeStamp, pTimeInfo, &source.time, pTraceFile->uPlatform);
+    keep_latest_time(pTraceFile, source.time);
+    write_prefix(pTraceFile, source);
+    return 0;
+}
+
+void output_end_rec() {
+    // A state left by an earlier record has no flag set and may belong to a file
+    // that its reader has closed since; only an open record's is looked at.
+    thread_info* pThread = anchor.pCurFile != nullptr ? anchor.pCurThread : nullptr;
+    anchor.outputFlags &= static_cast<uint8_t>(~OUTPUT_START_PENDING);
+    anchor.firstChar = 0;
+    if (pThread != nullptr && (pThread->outputFlags & THREAD_NEST_AFTER) != 0) {
+        if (pThread->nestingLevel < MAX_NESTING_LEVEL)
+            pThread->nestingLevel++;
+        pThread->outputFlags &= static_cast<uint16_t>(~THREAD_NEST_AFTER);
+    }
+    if (anchor.curColumn != 0)
+        output_char('\n');
+    if (pThread != nullptr && (pThread->outputFlags & THREAD_BLANK_LINE_AFTER) != 0) {
+        output_char('\n');
+        pThread->outputFlags &= static_cast<uint16_t>(~THREAD_BLANK_LINE_AFTER);
+    }
+    anchor.pCurFile = nullptr;
+    anchor.headerIndent = 0;
+    anchor.currentIndent = 0;
+}
