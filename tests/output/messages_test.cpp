@@ -1,0 +1,98 @@
+#include "messages.h"
+
+#include "handover.h"
+#include "insufficient.h"
+#include "kelvo.h"
+#include "print.h"
+#include "stdout_stream.h"
+#include "usage.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <string>
+#include <thread>
+
+using testing::EndsWith;
+using testing::HasSubstr;
+using testing::StartsWith;
+using testing::internal::CaptureStderr;
+using testing::internal::CaptureStdout;
+using testing::internal::GetCapturedStderr;
+using testing::internal::GetCapturedStdout;
+
+namespace {
+
+std::string flushed_stdout() {
+    stdout_flush();
+    return GetCapturedStdout();
+}
+
+TEST(Messages, GoToStandardErrorWithTheirEnds) {
+    CaptureStderr();
+    output_err_message("%s: 2625-105 File \"%s\" is too small to be a trace file.\n", "kelvo", "x");
+    output_sys_message("%s: 2625-102 Error opening file \"%s\",", ENOENT, "kelvo", "x");
+    output_err_text("%d%%\n", 5);
+    EXPECT_EQ(GetCapturedStderr(), "kelvo: 2625-105 File \"x\" is too small to be a trace file.\n\n"
+                                   "kelvo: 2625-102 Error opening file \"x\", No such file or "
+                                   "directory\n5%\n");
+    for (const size_t size : {4093U, 4094U, 4095U, 4096U, 70000U}) {
+        const std::string longName(size, 'n');
+        CaptureStderr();
+        output_err_message("%s", longName.c_str());
+        EXPECT_EQ(GetCapturedStderr(), longName + "\n");
+    }
+}
+
+TEST(Messages, AreCutAndReplacedOnStandardOutput) {
+    CaptureStdout();
+    output_message("%s", std::string(5000, 'a').c_str());
+    const char* volatile pRefused = "%2147483648d"; // the compiler would warn of it
+    output_printf(pRefused, 1);
+    EXPECT_EQ(flushed_stdout(), std::string(4095, 'a') + "kelvo error in output_vprintf()");
+}
+
+TEST(Usage, IsWrittenAsItStands) {
+    CaptureStdout();
+    output_usage();
+    const std::string text = flushed_stdout();
+    EXPECT_THAT(text, StartsWith("kelvo [-fhbrl] [-o <dtic>] [-t <templatepath>]\n"
+                                 "      [-s \"<start time>\"] filename ...\n\nwhere:\n\n"));
+    EXPECT_THAT(text, HasSubstr("      c Component id (e.g.\"_ZPB\")\n"));
+    EXPECT_THAT(text, EndsWith("records from the beginning (+) or end (-) of the file.\n"));
+}
+
+// Texts of another thread wait for the main thread, in order, and end a record
+// that was given up.
+TEST(Handover, KeepsTheOrderForTheMainThread) {
+    CaptureStdout();
+    CaptureStderr();
+    anchor.threadId = pthread_self();
+    const uint32_t warnings = insufficient_resources_warnings();
+    const uint32_t duringOpen = insufficient_resources_warnings_during_open();
+    std::thread([] {
+        output_message("%s: in use\n", "kelvo");
+        warn_insufficient_resources_during_open("trace", 1L << 40);
+        warn_insufficient_resources(nullptr, 1);
+        output_message("last\n");
+    }).join();
+    EXPECT_TRUE(stdout_is_empty());
+    anchor.curColumn = 5;
+    anchor.currentIndent = 5;
+    anchor.outputFlags = OUTPUT_START_PENDING;
+    stdout_write("12345");
+    write_handed_over_output();
+    write_handed_over_output();
+    warn_insufficient_resources_during_open("main", 8);
+    anchor.threadId = {};
+    EXPECT_EQ(flushed_stdout(), "12345\nkelvo: in use\n\t[INSUFFICIENT MEMORY TO PROCESS]\nlast\n"
+                                "\t[INSUFFICIENT MEMORY TO PROCESS]\n");
+    EXPECT_EQ(GetCapturedStderr(),
+              "WARNING: Insufficient memory (size=1099511627776) to process: trace\n"
+              "WARNING: Insufficient memory (size=8) to process: main\n");
+    EXPECT_EQ(insufficient_resources_warnings() - warnings, 2U);
+    EXPECT_EQ(insufficient_resources_warnings_during_open() - duringOpen, 2U);
+}
+
+} // namespace
