@@ -298,8 +298,8 @@ TEST_F(Merge, ARejectedFileKeepsEveryByteAndItsTimes) {
 
     const command_result result = run();
     EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.sErr,
-              "kelvo: 2625-107 File \"" + m_paths[0] + "\" is not a valid trace file.\n\n");
+    EXPECT_EQ(result.sErr, KELVO_PROGRAM ": 2625-107 File \"" + m_paths[0] +
+                               "\" is not a valid trace file.\n\n");
     EXPECT_EQ(parse_printed(result.sOut).size(), 1U);
     EXPECT_EQ(read_file(m_paths[0]), rejected.bytes());
     struct stat status {};
