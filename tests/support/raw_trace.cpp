@@ -16,6 +16,12 @@ using file_handle = std::unique_ptr<FILE, close_file>;
 
 } // namespace
 
+void add_bytes(std::vector<std::byte>* pBytes, trace_bytes more) {
+    const size_t uEnd = pBytes->size();
+    pBytes->resize(uEnd + more.size());
+    std::copy(more.begin(), more.end(), pBytes->begin() + static_cast<ptrdiff_t>(uEnd));
+}
+
 std::vector<std::byte> raw_record_bytes(const raw_record& record) {
     trace_record_header header{};
     header.length = static_cast<uint32_t>(
@@ -29,7 +35,7 @@ std::vector<std::byte> raw_record_bytes(const raw_record& record) {
     header.threadId = record.threadId;
     header.timeStamp = record.timeStamp;
     std::vector<std::byte> bytes = raw_bytes(header);
-    bytes.insert(bytes.end(), record.body.begin(), record.body.end());
+    add_bytes(&bytes, record.body);
     return bytes;
 }
 
@@ -101,6 +107,6 @@ std::vector<std::byte> read_file(const std::string& path) {
     std::byte buffer[65536];
     size_t uRead = 0;
     while (pFile != nullptr && (uRead = fread(buffer, 1, sizeof(buffer), pFile.get())) > 0)
-        bytes.insert(bytes.end(), buffer, buffer + uRead);
+        add_bytes(&bytes, trace_bytes(buffer).first(uRead));
     return bytes;
 }

@@ -7,10 +7,14 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <span>
 #include <string>
 #include <string_view>
 #include <type_traits>
 #include <vector>
+
+/// Adds a copy of `more` to `*pBytes`.
+void add_bytes(std::vector<std::byte>* pBytes, trace_bytes more);
 
 /// The bytes of the arguments, one behind the other without padding: numbers as
 /// they are, string views without a NUL.
@@ -19,12 +23,10 @@ template <class... T> std::vector<std::byte> raw_bytes(const T&... values) {
     const auto add = [&bytes](const auto& value) {
         using value_type = std::remove_cvref_t<decltype(value)>;
         if constexpr (std::is_convertible_v<const value_type&, std::string_view>) {
-            const auto text = std::as_bytes(std::span(std::string_view(value)));
-            bytes.insert(bytes.end(), text.begin(), text.end());
+            add_bytes(&bytes, std::as_bytes(std::span(std::string_view(value))));
         } else {
             static_assert(std::is_trivially_copyable_v<value_type>);
-            const auto number = std::as_bytes(std::span(&value, 1));
-            bytes.insert(bytes.end(), number.begin(), number.end());
+            add_bytes(&bytes, std::as_bytes(std::span(&value, 1)));
         }
     };
     (add(values), ...);

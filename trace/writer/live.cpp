@@ -52,9 +52,9 @@ void trace_writer::answer_reader() {
     if (uTailReq != 0)
         return;
     // A reader that raises the word from now on must not find the old answer:
-    // either it sees the bit cleared, or its request is seen here.
+    // either it sees the bit cleared, or its request is seen here. (Both
+    // accesses are sequentially consistent.)
     shared_flags(pMap).fetch_and(static_cast<uint16_t>(~TRC_FLAG_TAIL_ACK));
-    std::atomic_thread_fence(std::memory_order_seq_cst);
     if (shared_tail_request(pMap).load() != 0)
         shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK);
     else

@@ -1,0 +1,308 @@
+// The protocol with a reader, step by step on one thread; a reader that dies;
+// and the whole of it with reader and writer on two threads.
+#include "live_reader.h"
+#include "raw_trace.h"
+#include "reference_reader.h"
+#include "temp_dir.h"
+#include "trace_writer.h"
+
+#include <algorithm>
+#include <atomic>
+#include <csignal>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <random>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+
+namespace {
+
+constexpr uint32_t HEADER = sizeof(trace_file_header);
+
+class live_trace : public testing::Test {
+protected:
+    void make(uint32_t uArea) {
+        trace_writer_options options;
+        options.uFileSize = HEADER + uArea;
+        options.bForgetDeadReaders = false; // the reader is in this process
+        ASSERT_EQ(writer.create(dir.file("trace").c_str(), options), TRACE_WRITER_OK);
+    }
+
+    /// Appends the next number in a record of `uLength` bytes.
+    trace_writer_status append(uint32_t uLength = 32) {
+        std::vector<std::byte> body = raw_bytes(++uNumber);
+        body.resize(uLength - sizeof(trace_record_header));
+        return writer.append(TRC_FUNC_ID, {"_TST", 1, uNumber}, body);
+    }
+
+    /// The whole handshake of a reader, the writer polling.
+    void start(live_reader& reader) {
+        reader.raise_request();
+        writer.poll();
+        ASSERT_TRUE(reader.is_acknowledged());
+        ASSERT_TRUE(reader.find_first());
+        reader.lower_request();
+        writer.poll();
+        ASSERT_FALSE(reader.is_acknowledged());
+    }
+
+    /// The numbers that the reader can read now; a record of kind 0xFFFE as 0.
+    static std::vector<uint32_t> read(live_reader& reader, size_t uMost = SIZE_MAX) {
+        std::vector<uint32_t> numbers;
+        while (numbers.size() < uMost) {
+            const live_reader::result result = reader.look();
+            EXPECT_NE(result, live_reader::CORRUPT);
+            if (result != live_reader::RECORD)
+                break;
+            if (reader.header.function != TRC_FUNC_FILLER)
+                numbers.push_back(load<uint32_t>(reader.body, 0));
+            reader.step();
+        }
+        return numbers;
+    }
+
+    std::string problem() {
+        return list_ring(writer.mapping()).problem;
+    }
+
+    using numbers = std::vector<uint32_t>;
+    const temp_dir dir;
+    trace_writer writer;
+    uint32_t uNumber = 0;
+};
+
+TEST_F(live_trace, reader_that_finds_an_empty_ring_reads_what_comes) {
+    make(400);
+    live_reader reader(writer.mapping());
+    start(reader);
+    EXPECT_EQ(read(reader), numbers{});
+    for (uint32_t i = 1; i <= 50; ++i) {
+        ASSERT_EQ(append(28 + 4 * (i % 20 + 1)), TRACE_WRITER_OK);
+        ASSERT_EQ(read(reader), numbers{i});
+        ASSERT_EQ(problem(), "");
+    }
+    EXPECT_EQ(writer.counts().uDropped, 0U);
+}
+
+TEST_F(live_trace, records_are_held_while_the_reader_looks_for_its_first) {
+    make(1000);
+    ASSERT_EQ(append(), TRACE_WRITER_OK);
+    live_reader reader(writer.mapping());
+    reader.raise_request();
+    ASSERT_EQ(append(), TRACE_WRITER_OK);
+    EXPECT_TRUE(reader.is_acknowledged());
+    const auto oldest = [this] {
+        return load<trace_file_header>(writer.mapping(), 0).uOldestRecordOffset;
+    };
+    EXPECT_EQ(oldest(), HEADER + 32U);
+    ASSERT_EQ(append(), TRACE_WRITER_OK);
+    EXPECT_EQ(writer.counts().uHeld, 2U);
+    EXPECT_EQ(problem(), "");
+    ASSERT_TRUE(reader.find_first());
+    EXPECT_EQ(reader.offset(), HEADER);
+    while (append() == TRACE_WRITER_OK) // nothing is given up meanwhile
+        ASSERT_EQ(problem(), "");
+    const uint32_t uDropped = uNumber;
+    reader.lower_request();
+    EXPECT_EQ(read(reader), numbers{1}) << "held records are not to be seen yet";
+    writer.poll();
+    EXPECT_FALSE(reader.is_acknowledged());
+    EXPECT_EQ(problem(), "");
+    numbers expected;
+    for (uint32_t i = 2; i < uDropped; ++i)
+        expected.push_back(i);
+    EXPECT_EQ(read(reader), expected);
+    ASSERT_EQ(append(), TRACE_WRITER_OK);
+    EXPECT_EQ(writer.counts().uDiscards, 1U);
+    EXPECT_EQ(read(reader), (numbers{0, uNumber}));
+    EXPECT_EQ(problem(), "");
+}
+
+TEST_F(live_trace, nothing_is_given_up_that_the_reader_has_not_passed) {
+    make(28 + 32 * 8);
+    for (int i = 0; i < 20; ++i)
+        ASSERT_EQ(append(), TRACE_WRITER_OK);
+    live_reader reader(writer.mapping());
+    start(reader);
+    uint32_t uNext = 0;
+    for (size_t uStep = 1; uStep <= 3; ++uStep) {
+        const numbers passed = read(reader, uStep);
+        ASSERT_EQ(passed.size(), uStep);
+        ASSERT_EQ(reader.look(), live_reader::RECORD); // the next one is being copied
+        uNext = passed.back() + 1;
+        while (append() == TRACE_WRITER_OK)
+            ASSERT_EQ(problem(), "");
+        EXPECT_EQ(append(), TRACE_WRITER_DROPPED);
+        const std::vector<ring_element> records = list_ring(writer.mapping()).records();
+        EXPECT_EQ(load<uint32_t>(records[0].body, 0), uNext) << "given up, or room left unused";
+        EXPECT_EQ(problem(), "");
+    }
+    const uint32_t uLast = static_cast<uint32_t>(writer.counts().uAppended);
+    numbers all = read(reader);
+    EXPECT_EQ(all.front(), uNext);
+    ASSERT_EQ(append(), TRACE_WRITER_OK);
+    EXPECT_EQ(writer.counts().uAppended, uLast + 2U);
+    EXPECT_EQ(read(reader), (numbers{0, uNumber})) << "0xFFFE speaks for what was dropped";
+    reader.close();
+    ASSERT_EQ(append(28 + 32 * 8 - 28), TRACE_WRITER_OK) << "no reader, no drops";
+    EXPECT_EQ(problem(), "");
+}
+
+TEST_F(live_trace, record_longer_than_both_ends_follows_a_reader_round) {
+    make(1000);
+    live_reader reader(writer.mapping());
+    start(reader);
+    for (int i = 0; i < 16; ++i)
+        ASSERT_EQ(append(), TRACE_WRITER_OK);
+    ASSERT_EQ(read(reader).size(), 16U);
+    // The reader stands on the gap in the middle, which cannot be taken away.
+    numbers seen;
+    for (int i = 0; i < 3; ++i) {
+        append(900);
+        const numbers now = read(reader);
+        seen.insert(seen.end(), now.begin(), now.end());
+        ASSERT_EQ(problem(), "");
+    }
+    EXPECT_EQ(seen.back(), uNumber);
+    EXPECT_LE(writer.counts().uDropped, 2U);
+}
+
+TEST_F(live_trace, reader_that_died_does_not_stop_the_writer) {
+    const std::string path = dir.file("trace");
+    for (const bool bInHandshake : {false, true}) {
+        trace_writer_options options;
+        options.uFileSize = 1000;
+        ASSERT_EQ(writer.create(path.c_str(), options), TRACE_WRITER_OK);
+        ASSERT_EQ(append(), TRACE_WRITER_OK);
+        int ready[2];
+        ASSERT_EQ(pipe(ready), 0);
+        const pid_t pid = fork();
+        ASSERT_GE(pid, 0);
+        if (pid == 0) {
+            struct flock lock {};
+            lock.l_type = F_WRLCK;
+            const int fd = open(path.c_str(), O_RDWR | O_CLOEXEC);
+            live_reader reader(writer.mapping());
+            reader.raise_request();
+            const bool bFound = fcntl(fd, F_SETLK, &lock) == 0 && reader.find_first();
+            if (!bInHandshake)
+                reader.lower_request();
+            const char cReady = bFound ? 'y' : 'n';
+            while (write(ready[1], &cReady, 1) == 1)
+                pause();
+            _exit(1);
+        }
+        char cReady = 0;
+        ASSERT_EQ(::read(ready[0], &cReady, 1), 1);
+        EXPECT_EQ(cReady, 'y');
+        trace_writer_status status = TRACE_WRITER_OK;
+        for (int i = 0; i < 100 && status == TRACE_WRITER_OK; ++i)
+            status = append();
+        usleep(20'000);
+        EXPECT_EQ(append(), TRACE_WRITER_DROPPED);
+        kill(pid, SIGKILL);
+        ASSERT_EQ(waitpid(pid, nullptr, 0), pid);
+        ::close(ready[0]);
+        ::close(ready[1]);
+        for (int i = 0; i < 10'000 && (status = append()) == TRACE_WRITER_DROPPED; ++i)
+            usleep(1000);
+        EXPECT_EQ(status, TRACE_WRITER_OK);
+        const auto header = load<trace_file_header>(writer.mapping(), 0);
+        EXPECT_EQ(header.uSeqLock, TRC_SEQ_NO_READER);
+        EXPECT_EQ(header.uTailReq, 0U);
+        EXPECT_EQ(header.uFlags & TRC_FLAG_TAIL_ACK, 0);
+        EXPECT_EQ(writer.counts().uDiscards, 1U);
+        EXPECT_EQ(problem(), "");
+    }
+}
+
+// A writer at full speed and a reader that comes and goes: whatever was not
+// dropped is seen by a reader exactly once and in order, from its first record
+// to the last one before it leaves.
+class live_stress : public live_trace, public testing::WithParamInterface<uint32_t> {
+protected:
+    static constexpr uint32_t APPENDS = 60'000;
+
+    void write_all(uint32_t uLongest) {
+        std::mt19937 engine(uLongest);
+        const auto random = [&engine] { return static_cast<uint32_t>(engine()); };
+        for (uint32_t i = 0; i < APPENDS; ++i) {
+            const uint32_t uLength = random() % 16 == 0 ? uLongest : std::min(uLongest, 64U);
+            const trace_writer_status status = append(32 + 4 * (random() % ((uLength - 28) / 4)));
+            ASSERT_GE(status, TRACE_WRITER_OK);
+            if (status == TRACE_WRITER_OK)
+                accepted.push_back(uNumber);
+            else
+                std::this_thread::yield();
+        }
+        bWritten = true;
+        while (!bReaderDone.load()) { // answer the last reader
+            writer.poll();
+            std::this_thread::yield();
+        }
+    }
+
+    /// One reader's session of at most `uMost` records.
+    void read_session(uint32_t uMost) {
+        live_reader reader(writer.mapping());
+        reader.raise_request();
+        while (!reader.is_acknowledged())
+            std::this_thread::yield();
+        bool bSound = reader.find_first();
+        reader.lower_request();
+        numbers seen;
+        while (bSound && seen.size() < uMost) {
+            const live_reader::result result = reader.look();
+            bSound = result != live_reader::CORRUPT;
+            if (result == live_reader::RECORD) {
+                if (reader.header.function == TRC_FUNC_ID)
+                    seen.push_back(load<uint32_t>(reader.body, 0));
+                reader.step();
+            } else if (bWritten.load() && result == live_reader::NO_RECORD) {
+                break;
+            } else {
+                std::this_thread::yield();
+            }
+        }
+        EXPECT_TRUE(bSound) << "function " << unsigned{reader.header.function} << " length "
+                            << uint32_t{reader.header.length} << " at " << reader.offset();
+        reader.close();
+        sessions.push_back(std::move(seen));
+    }
+
+    numbers accepted;              // writer's
+    std::vector<numbers> sessions; // reader's
+    std::atomic<bool> bReaderDone{false};
+    std::atomic<bool> bWritten{false};
+};
+
+TEST_P(live_stress, reader_sees_every_record_once_and_in_order) {
+    make(GetParam());
+    const uint32_t uLongest = std::max(36U, std::min(writer.max_record_length(), 600U));
+    std::thread reading([this] {
+        for (int i = 0; i < 40 && !HasFailure(); ++i)
+            read_session(i % 2 == 0 ? 50 : 1500);
+        bReaderDone = true;
+    });
+    write_all(uLongest);
+    reading.join();
+
+    EXPECT_EQ(problem(), "");
+    size_t uSeen = 0;
+    for (const numbers& seen : sessions) {
+        uSeen += seen.size();
+        if (seen.empty())
+            continue;
+        const auto pFirst = std::lower_bound(accepted.begin(), accepted.end(), seen.front());
+        ASSERT_LE(seen.size(), static_cast<size_t>(accepted.end() - pFirst));
+        EXPECT_EQ(numbers(pFirst, pFirst + static_cast<ptrdiff_t>(seen.size())), seen);
+    }
+    EXPECT_GT(uSeen, 40U);
+    EXPECT_EQ(accepted.size() + writer.counts().uDiscards, writer.counts().uAppended);
+    EXPECT_EQ(accepted.size() + writer.counts().uDropped, APPENDS);
+}
+
+INSTANTIATE_TEST_SUITE_P(areas, live_stress, testing::Values(128, 332, 1000, 5000, 100'000));
+
+} // namespace
