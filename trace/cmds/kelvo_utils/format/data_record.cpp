@@ -7,33 +7,31 @@
 #include "record_bodies.h"
 #include "record_text.h"
 
-/// Takes the first block off `*pBlocks` and stores its data. Returns false when
-/// no block is left. A block whose length is negative or leads beyond the end
-/// is the last one and is cut.
-static bool take_block(trace_bytes* pBlocks, trace_bytes* pData) {
-    if (!lies_inside(*pBlocks, 0, sizeof(trace_data)))
-        return false;
-    // A negative length, taken as unsigned, is beyond any end.
-    const size_t uLength = load<uint32_t>(*pBlocks, 0);
-    *pData = load_run(*pBlocks, sizeof(trace_data), uLength);
-    const size_t uUsed = sizeof(trace_data) + pData->size();
-    *pBlocks = load_run(*pBlocks, (uUsed + 3) / 4 * 4);
-    return true;
+/// The form of a block without a format.
+static void write_block_plainly(uint32_t uBlock, trace_bytes data) {
+    text_run out;
+    out.add("----------------- Data Block ");
+    put_decimal(out, uBlock);
+    out.add(" ----------------");
+    out.flush();
+    format_hex(data);
 }
 
 /// Writes the format of the record, or its form without one, and moves
 /// `*pBlocks` past the blocks used. Returns their number.
 static uint32_t write_leading_blocks(const record_view& record, const format_entry* pFormat,
                                      uint32_t uBlocks, trace_bytes* pBlocks) {
-    static constinit parm_list parms{}; // static: see format_data_block
     if (!pFormat) {
-        record_text().add("id=").add_hex(record.uTraceId, 8).add("\n").write();
+        text_run out;
+        put_trace_id(out, record.uTraceId);
+        out.add('\n');
         return 0;
     }
     if (pFormat->numParms == 0) {
         format_parms(pFormat, nullptr, record.pFile->addrMode64);
         return 0;
     }
+    static constinit parm_list parms{}; // static: see format_data_block
     bld_parm_list_unpacked(pFormat, pBlocks, uBlocks, &parms);
     format_parms(pFormat, &parms, record.pFile->addrMode64);
     return static_cast<uint32_t>(parms.numParms);
@@ -53,21 +51,15 @@ int format_data_record(const record_view& record) {
         return 0;
 
     trace_bytes data;
-    for (uint32_t i = uFirstFree; i < uBlocks && take_block(&blocks, &data); i++) {
+    for (uint32_t i = uFirstFree; i < uBlocks && take_data_block(&blocks, &data); i++) {
         pFormat = find_record_format(record, record.uTraceId, static_cast<int>(i),
                                      &insufficient_resources);
         if (insufficient_resources)
             return 1;
-        if (pFormat) {
+        if (pFormat)
             format_data_block(pFormat, data, record.pFile->addrMode64);
-        } else {
-            record_text()
-                .add("----------------- Data Block ")
-                .add_decimal(i)
-                .add(" ----------------")
-                .write();
-            format_hex(data);
-        }
+        else
+            write_block_plainly(i, data);
     }
     return 0;
 }

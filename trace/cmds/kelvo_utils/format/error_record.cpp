@@ -10,12 +10,12 @@
 #include "parms.h"
 #include "record_bodies.h"
 #include "record_text.h"
-#include "sink.h"
 
 #include <algorithm>
 #include <array>
 #include <memory>
 #include <new>
+#include <string_view>
 
 static_assert(QUEUE_ELEMENT_OVERHEAD > offsetof(trace_queue_element, header),
               "a byte follows the record copy in its block");
@@ -153,26 +153,33 @@ void write_by_format(const format_entry* pFormatEntry, const record_view& record
     format_parms(pFormatEntry, &parms, 0);
 }
 
-/// The form without a format. Strings go straight to the sink, whole however
-/// long they are.
+void put_text(text_run& out, const char* pText) {
+    if (pText)
+        out.add(std::string_view(pText));
+}
+
+/// The form without a format. Strings are written whole, however long they are.
 void write_plainly(const record_view& record, const error_texts& texts, const char* pMessage) {
-    const auto iError = load<int32_t>(record.bytes, offsetof(trace_record_error, errorId));
-    const auto iLine = load<int32_t>(record.bytes, offsetof(trace_record_error, lineNumber));
-    record_text().add("id=").add_hex(record.uTraceId, 8).add("Error ").add_decimal(iError).write();
-    output_text(" was returned from \"");
-    output_string(texts.pFunction);
-    record_text().add("\" on line ").add_decimal(iLine).add(" in file \"").write();
-    output_string(texts.pFile);
-    output_text("\".\n");
+    text_run out;
+    put_trace_id(out, record.uTraceId);
+    out.add("Error ");
+    put_decimal(out, load<int32_t>(record.bytes, offsetof(trace_record_error, errorId)));
+    out.add(" was returned from \"");
+    put_text(out, texts.pFunction);
+    out.add("\" on line ");
+    put_decimal(out, load<int32_t>(record.bytes, offsetof(trace_record_error, lineNumber)));
+    out.add(" in file \"");
+    put_text(out, texts.pFile);
+    out.add("\".\n");
     if (pMessage) {
-        output_text("   Message=");
-        output_string(pMessage);
-        output_char('\n');
+        out.add("   Message=");
+        put_text(out, pMessage);
+        out.add('\n');
     }
     if (texts.pFfdcId) {
-        output_text("   FFDCID=\"");
-        output_string(texts.pFfdcId);
-        output_text("\"\n");
+        out.add("   FFDCID=\"");
+        put_text(out, texts.pFfdcId);
+        out.add("\"\n");
     }
 }
 

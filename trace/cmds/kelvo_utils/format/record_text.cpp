@@ -1,40 +1,36 @@
 #include "record_text.h"
 
-#include "sink.h"
+#include "digits.h"
 
-#include <algorithm>
 #include <charconv>
-#include <cstring>
 
-record_text& record_text::add(std::string_view piece) {
-    const size_t uTaken = std::min(piece.size(), uCapacity - uLength);
-    std::memcpy(text + uLength, piece.data(), uTaken);
-    uLength += uTaken;
-    return *this;
+static std::string_view text_between(const char* pStart, const char* pEnd) {
+    return {pStart, static_cast<size_t>(pEnd - pStart)};
 }
 
-record_text& record_text::add_hex(uint64_t uValue, int iDigits) {
-    static constexpr char digits[] = "0123456789abcdef";
-    char piece[2 + 16] = {'0', 'x'};
-    for (int i = iDigits; i > 0; i--) {
-        piece[1 + i] = digits[uValue & 0xF];
-        uValue >>= 4;
-    }
-    return add({piece, 2 + static_cast<size_t>(iDigits)});
+void put_hex(text_run& out, uint64_t uValue, int iDigits) {
+    char text[2 + DIGITS_ROOM] = {'0', 'x'};
+    out.add(text_between(text, put_number(text + 2, uValue, 16, iDigits, '0')));
 }
 
-record_text& record_text::add_decimal(int64_t iValue) {
-    char piece[24];
-    const auto end = std::to_chars(piece, piece + sizeof(piece), iValue).ptr;
-    return add({piece, static_cast<size_t>(end - piece)});
+void put_decimal(text_run& out, int64_t iValue) {
+    char text[DIGITS_ROOM];
+    out.add(text_between(text, std::to_chars(text, text + sizeof(text), iValue).ptr));
 }
 
-void record_text::write() const {
-    output_text({text, uLength});
+void put_trace_id(text_run& out, uint32_t uTraceId) {
+    out.add("id=");
+    put_hex(out, uTraceId, 8);
 }
 
-void format_string(std::string_view string) {
+void put_index(text_run& out, size_t uIndex) {
+    out.add('[');
+    put_decimal(out, static_cast<int64_t>(uIndex));
+    out.add("]=");
+}
+
+void format_string(text_run& out, std::string_view string) {
     if (string.ends_with('\n'))
         string.remove_suffix(1);
-    output_text(string);
+    out.add(string);
 }

@@ -1,29 +1,21 @@
-// Text of the fixed forms, put together without the printf family. Main thread
-// only.
+// Numbers and strings of the fixed forms. Main thread only.
 #pragma once
 
-#include <cstddef>
+#include "text_run.h"
+
 #include <cstdint>
 #include <string_view>
 
-/// A short piece of text under construction. What does not fit is cut; every
-/// fixed form fits.
-class record_text {
-public:
-    record_text& add(std::string_view text);
-    /// "0x" and the lowest `iDigits` hexadecimal digits of `uValue`.
-    record_text& add_hex(uint64_t uValue, int iDigits);
-    record_text& add_decimal(int64_t iValue);
+/// "0x" and at least `iDigits` hexadecimal digits.
+void put_hex(text_run& out, uint64_t uValue, int iDigits);
 
-    /// Hands the text to the character sink.
-    void write() const;
+void put_decimal(text_run& out, int64_t iValue);
 
-private:
-    static constexpr size_t uCapacity = 128;
+/// "id=" and the trace id.
+void put_trace_id(text_run& out, uint32_t uTraceId);
 
-    char text[uCapacity];
-    size_t uLength = 0;
-};
+/// "[%d]=" with the position in an array.
+void put_index(text_run& out, size_t uIndex);
 
 /// Writes a string of a record, but not a newline that ends it.
-void format_string(std::string_view string);
+void format_string(text_run& out, std::string_view string);

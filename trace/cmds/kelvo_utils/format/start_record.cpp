@@ -4,18 +4,16 @@
 void write_start(const record_view& record, const format_entry* pFormat) {
     replace_time_base(record.pFile,
                       load_time_base(record.bytes, offsetof(trace_record_start, timeInfo)));
-    if (pFormat) {
+    if (pFormat)
         format_data_block(pFormat, parameter_data(record), record.pFile->addrMode64);
-    } else {
-        const auto uPid = load<uint32_t>(record.bytes, offsetof(trace_record_start, pid));
-        record_text()
-            .add("id=")
-            .add_hex(record.uTraceId, 8)
-            .add("[0]=")
-            .add_hex(uPid, 8)
-            .add("\n")
-            .write();
+
+    text_run out;
+    if (!pFormat) {
+        put_trace_id(out, record.uTraceId);
+        put_index(out, 0);
+        put_hex(out, load<uint32_t>(record.bytes, offsetof(trace_record_start, pid)), 8);
+        out.add('\n');
     }
     if (record.pKind->uFunction == TRC_FUNC_RESTART)
-        format_string(load_string(record.bytes, sizeof(trace_record_start)));
+        format_string(out, load_string(record.bytes, sizeof(trace_record_start)));
 }

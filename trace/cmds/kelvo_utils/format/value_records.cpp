@@ -1,6 +1,5 @@
 #include "record_bodies.h"
 #include "record_text.h"
-#include "sink.h"
 
 namespace {
 
@@ -28,16 +27,19 @@ void write_values(const record_view& record, const format_entry* pFormat) {
     const int iDigits = hex_digits(data.uElementSize);
     const uint64_t uFirst = load_value(record.bytes, data.uOffset, data.uElementSize);
 
-    record_text text;
-    text.add("id=").add_hex(record.uTraceId, 8);
+    text_run out;
+    put_trace_id(out, record.uTraceId);
     if (data.uCount == 1) {
-        text.add(" val=").add_hex(uFirst, iDigits);
+        out.add(" val=");
+        put_hex(out, uFirst, iDigits);
     } else if (data.uCount == 2) {
-        text.add(" val1=").add_hex(uFirst, iDigits);
-        text.add(" val2=").add_hex(
-            load_value(record.bytes, data.uOffset + data.uElementSize, data.uElementSize), iDigits);
+        out.add(" val1=");
+        put_hex(out, uFirst, iDigits);
+        out.add(" val2=");
+        put_hex(out, load_value(record.bytes, data.uOffset + data.uElementSize, data.uElementSize),
+                iDigits);
     }
-    text.add("\n").write();
+    out.add('\n');
 }
 
 void write_value_array(const record_view& record, const format_entry* pFormat) {
@@ -51,14 +53,12 @@ void write_value_array(const record_view& record, const format_entry* pFormat) {
     const bool bLines = element_count(record) > uPerLine;
     const size_t uPresent = values.size() / uSize;
 
-    record_text().add("id=").add_hex(record.uTraceId, 8).write();
+    text_run out;
+    put_trace_id(out, record.uTraceId);
     for (size_t i = 0; i < uPresent; i++) {
-        record_text()
-            .add(bLines && i % uPerLine == 0 ? "\n[" : " [")
-            .add_decimal(static_cast<int64_t>(i))
-            .add("]=")
-            .add_hex(load_value(values, i * uSize, uSize), hex_digits(uSize))
-            .write();
+        out.add(bLines && i % uPerLine == 0 ? '\n' : ' ');
+        put_index(out, i);
+        put_hex(out, load_value(values, i * uSize, uSize), hex_digits(uSize));
     }
-    output_char('\n');
+    out.add('\n');
 }
