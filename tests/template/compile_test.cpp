@@ -41,7 +41,7 @@ std::string compiled(const std::string& format) {
     EXPECT_EQ(messages, "");
     EXPECT_EQ(pEntry->pFile, &file);
     EXPECT_STREQ(pEntry->pString, format.c_str());
-    const std::string dump = dump_format(*pEntry);
+    std::string dump = dump_format(*pEntry);
     std::free(pEntry);
     return dump;
 }
@@ -182,7 +182,7 @@ TEST_F(Compile, MemoryExhaustionIsSilentAndLeavesTheTemplate) {
 
 TEST_F(Compile, RandomStringsCompileToConversionsInsideThem) {
     std::mt19937 random(5);
-    const std::string alphabet("%%%%$**.0123-lhLdsfcxzT \x80\n", 27);
+    const std::string alphabet = "%%%%$**.0123-lhLdsfcxzT \x80\n";
     messages_of([&] {
         for (int round = 0; round < 20000; ++round) {
             std::string format;

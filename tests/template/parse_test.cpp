@@ -207,7 +207,7 @@ TEST_F(Parse, OnlyTheFormatBufferSetsTheMemoryFlag) {
 
 TEST_F(Parse, RandomFilesNeverFailButForTheirFormats) {
     std::mt19937 random(6);
-    const std::string alphabet("0018xaF:\"\"\"\"\\\\n#\n \0\xFF%d$", 24);
+    const std::string alphabet = "0018xaF:\"\"\"\"\\\\n#\n \0\xFF%d$"s;
     for (int round = 0; round < 3000; ++round) {
         std::string text;
         for (size_t uLeft = random() % 200; uLeft > 0; --uLeft)

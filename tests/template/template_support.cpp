@@ -68,15 +68,17 @@ std::string dump_format(const format_entry& entry) {
 }
 
 std::string dump_template(const template_file& file) {
-    std::string text;
-    for (const format_entry* pEntry = file.pFormats; pEntry; pEntry = pEntry->pNext) {
-        std::string line = std::to_string(pEntry->trace_id);
+    std::vector<const format_entry*> entries;
+    for (const format_entry* pEntry = file.pFormats; pEntry; pEntry = pEntry->pNext)
+        entries.insert(entries.begin(), pEntry);
+    std::ostringstream out;
+    for (const format_entry* pEntry : entries) {
+        out << (pEntry == entries.front() ? "" : " ") << pEntry->trace_id;
         if (pEntry->block_id != -1)
-            line += '/' + std::to_string(pEntry->block_id);
-        line += std::string(":") + pEntry->pString;
-        text = text.empty() ? line : line + ' ' + text;
+            out << '/' << pEntry->block_id;
+        out << ':' << pEntry->pString;
     }
-    return text;
+    return out.str();
 }
 
 std::vector<std::string> messages_of(const std::function<void()>& action) {
