@@ -11,7 +11,7 @@
 
 namespace {
 
-constexpr uint32_t RECORDS = 20'000;
+constexpr uint32_t RECORDS = 200'000;
 
 /// Appends records whose value is their place, of changing lengths, and waits
 /// for the reader where it leaves no room.
@@ -59,7 +59,7 @@ TEST(Live, reader_sees_every_record_once_and_whole) {
     const temp_dir dir;
     trace_writer writer;
     trace_writer_options options;
-    options.uFileSize = 4096; // some hundred turns
+    options.uFileSize = 4096; // some thousand turns
     options.bForgetDeadReaders = false;
     ASSERT_EQ(writer.create(dir.file("live.trc").c_str(), options), TRACE_WRITER_OK);
 
