@@ -116,15 +116,24 @@ int64_t narrow(uint64_t uValue, int iBits, bool bSigned) {
                    : static_cast<int64_t>(uShifted >> iUnused);
 }
 
-/// The digits of `uValue`, made in `buffer`.
-std::string_view make_digits(char (&buffer)[24], char letter, uint64_t uValue) {
+/// Room for the digits of any integer and a sign.
+constexpr size_t INTEGER_ROOM = 24;
+static_assert(INTEGER_ROOM <= text_run::MAX_ROOM);
+
+/// Writes the digits of `uValue` at `pOut`; returns their end.
+char* put_digits(char* pOut, char letter, uint64_t uValue) {
     const int iBase = letter == 'o' ? 8 : letter == 'x' || letter == 'X' ? 16 : 10;
-    char* pEnd = std::to_chars(buffer, std::end(buffer), uValue, iBase).ptr;
+    char* pEnd = std::to_chars(pOut, pOut + INTEGER_ROOM - 1, uValue, iBase).ptr;
     if (letter == 'X')
-        for (char* pDigit = buffer; pDigit < pEnd; pDigit++)
-            if (*pDigit >= 'a')
-                *pDigit = static_cast<char>(*pDigit - 'a' + 'A');
-    return {buffer, static_cast<size_t>(pEnd - buffer)};
+        for (; pOut < pEnd; pOut++)
+            if (*pOut >= 'a')
+                *pOut = static_cast<char>(*pOut - 'a' + 'A');
+    return pEnd;
+}
+
+/// Whether there are neither flags nor width nor precision.
+bool is_bare(const conversion& conv) {
+    return conv.uFlags == 0 && conv.iWidth == 0 && conv.iPrecision < 0;
 }
 
 std::string_view sign_of(const conversion& conv, bool bNegative) {
@@ -149,12 +158,13 @@ void write_number(text_run& out, const conversion& conv, int64_t iValue) {
     const bool bSigned = is_signed(conv.letter);
     const bool bNegative = bSigned && iValue < 0;
     const auto uValue = static_cast<uint64_t>(iValue);
-    char buffer[24];
+    const uint64_t uMagnitude = bNegative ? -uValue : uValue;
+    char buffer[INTEGER_ROOM];
     field_parts parts;
     if (bSigned)
         parts.prefix = sign_of(conv, bNegative);
     if (iValue != 0 || conv.iPrecision != 0)
-        parts.digits = make_digits(buffer, conv.letter, bNegative ? -uValue : uValue);
+        parts.digits = {buffer, put_digits(buffer, conv.letter, uMagnitude)};
     parts.iZeros = std::max<int64_t>(conv.iPrecision - size_of(parts.digits), 0);
     if (conv.uFlags & CONVERSION_ALTERN)
         add_base_mark(parts, conv.letter, iValue == 0);
@@ -170,8 +180,20 @@ void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int i
         write_by_printf(out, conv, "", reinterpret_cast<void*>(static_cast<uintptr_t>(uValue)));
     else if (conv.uFlags & CONVERSION_GROUP)
         write_by_printf(out, conv, "ll", static_cast<long long>(iValue));
+    else if (is_bare(conv))
+        write_bare_integer(out, conv.letter, iValue);
     else
         write_number(out, conv, iValue);
+}
+
+void write_bare_integer(text_run& out, char letter, int64_t iValue) {
+    auto uMagnitude = static_cast<uint64_t>(iValue);
+    char* pOut = out.begin_room(INTEGER_ROOM);
+    if (iValue < 0 && is_signed(letter)) {
+        *pOut++ = '-';
+        uMagnitude = -uMagnitude;
+    }
+    out.end_room(put_digits(pOut, letter, uMagnitude));
 }
 
 void write_real(text_run& out, const conversion& conv, double value) {

@@ -199,6 +199,28 @@ void write_value(text_run& out, const conversion& conv, parm_type_t type, const 
     }
 }
 
+/// The shortcut for the conversions that most records consist of: a letter
+/// alone. Such a conversion has its parameter to itself, so the type is that of
+/// the letter. Returns false when there is no shortcut.
+bool write_bare(text_run& out, char letter, parm_type_t type, const parm_ref& parm) {
+    switch (type) {
+    case PARM_INT:
+        write_bare_integer(out, letter, load<int32_t>(parm.bytes, 0));
+        return true;
+    case PARM_INT | PARM_UNSIGNED:
+        write_bare_integer(out, letter, load<uint32_t>(parm.bytes, 0));
+        return true;
+    case PARM_CHAR | PARM_UNSIGNED:
+        out.add(load<char>(parm.bytes, 0));
+        return true;
+    case PARM_STRING:
+        out.add(parm_string(parm));
+        return true;
+    default:
+        return false;
+    }
+}
+
 void write_conversion(format_run& run, const conv_spec& place) {
     const format_entry& entry = *run.pEntry;
     const parm_type_t type = entry.pParmTypes[place.parmNum];
@@ -211,8 +233,10 @@ void write_conversion(format_run& run, const conv_spec& place) {
             run.out.add(text);
         return;
     }
-    // These go by no conversion of printf's, whatever stands in the text.
     const parm_ref& parm = run.parm(place.parmNum);
+    if (text.size() == 2 && write_bare(run.out, text[1], type, parm))
+        return;
+    // These go by no conversion of printf's, whatever stands in the text.
     switch (base_type(type)) {
     case PARM_RESOURCE_HANDLE:
         write_resource_handle(run.out, parm.bytes);

@@ -50,6 +50,18 @@ public:
         }
     }
 
+    /// Room for `uCount` characters, at most MAX_ROOM, which the caller writes in
+    /// place and then passes their end to end_room.
+    char* begin_room(size_t uCount) {
+        if (uCount > sizeof(text) - uLength)
+            flush();
+        return text + uLength;
+    }
+    void end_room(const char* pEnd) {
+        uLength = static_cast<size_t>(pEnd - text);
+    }
+    static constexpr size_t MAX_ROOM = 64;
+
     /// Needed before anything else writes to the sink.
     void flush() {
         if (uLength > 0)
