@@ -6,7 +6,6 @@
 
 #include <atomic>
 #include <cstdlib>
-#include <cstring>
 #include <new>
 #include <pthread.h>
 
@@ -49,7 +48,7 @@ void hand_over_output(std::string_view text, bool bStraight) {
     if (pBlock == nullptr)
         return;
     auto* pWaiting = new (pBlock) waiting_text{nullptr, text.size(), bStraight};
-    std::memcpy(pWaiting->text(), text.data(), text.size());
+    text.copy(pWaiting->text(), text.size());
 
     pthread_mutex_lock(&waiting_mutex);
     *ppEndWaiting = pWaiting;

@@ -42,7 +42,7 @@ __attribute__((format(printf, 1, 0))) void write_error_text(const char* pFormat,
         }
     }
     va_end(again);
-    std::memcpy(pText + length, tail.data(), tail.size());
+    tail.copy(pText + length, tail.size());
     write_all(STDERR_FILENO, {pText, length + tail.size()});
 }
 
