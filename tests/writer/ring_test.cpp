@@ -126,9 +126,7 @@ TEST(trace_ring, refuses_what_no_file_can_hold) {
     };
     for (const uint16_t function : std::initializer_list<uint16_t>{0, 18, 20, 0xFFFD, 0xFFFF})
         EXPECT_EQ(append(function, "_TST", 0), TRACE_WRITER_INVALID) << function;
-    for (const std::string_view compId : {"", "_TS", "_TSTX", "a\tbc", "abc\x7f",
-                                          "ab\xff"
-                                          "c"})
+    for (const std::string_view compId : {"", "_TS", "_TSTX", "a\tbc", "abc\x7f", "abc\xff"})
         EXPECT_EQ(append(TRC_FUNC_ID, compId, 4), TRACE_WRITER_INVALID) << compId;
     EXPECT_EQ(append(TRC_FUNC_DATA, "_TST", 745), TRACE_WRITER_TOO_LONG);
     EXPECT_EQ(writer.counts().uAppended, 0U);
