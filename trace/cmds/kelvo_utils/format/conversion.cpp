@@ -160,7 +160,7 @@ constexpr std::array<uint8_t, 128> make_classes_of_letters() {
     std::array<uint8_t, 128> table{};
     for (const auto& row : classes)
         for (const char letter : row.letters)
-            table[static_cast<size_t>(letter)] = row.argument;
+            table[static_cast<unsigned char>(letter)] = row.argument;
     return table;
 }
 constexpr auto classesOfLetters = make_classes_of_letters();

@@ -79,7 +79,7 @@ void widen_integer(isv_t& slot, parm_type_t type, int32_t iLength, trace_bytes d
     if (iLength == 1 && bUnsigned)
         slot.u32 = load<uint8_t>(data, 0);
     else if (iLength == 1)
-        slot.i32 = load<int8_t>(data, 0);
+        slot.i32 = load<int8_t>(data, 0); // NOLINT(bugprone-signed-char-misuse): a number
     else if (iLength == 2 && bUnsigned)
         slot.u32 = load<uint16_t>(data, 0);
     else if (iLength == 2)
