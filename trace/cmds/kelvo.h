@@ -82,11 +82,11 @@ struct format_entry {
 
 /// The formats of one component.
 struct template_file {
-    template_file* pNext;    ///< on-demand list; null for a preloaded template
-    char compId[4];          ///< not terminated
-    int32_t lineNumber;      ///< line ends read so far
-    format_entry* pFormats;  ///< newest first
-    char preload_path[4096]; ///< empty for a template loaded on demand
+    template_file* pNext;   ///< on-demand list; null for a preloaded template
+    char compId[4];         ///< not terminated
+    int32_t lineNumber;     ///< line ends read so far
+    format_entry* pFormats; ///< newest first
+    char* preload_path;     ///< file found by the preload, heap text; null when loaded on demand
 
     // Not part of the format of the record, but kept beside it:
     format_index_slot* pIndex;   ///< pFormats by ids; null for a small template

@@ -3,6 +3,7 @@
 #include "frame.h"
 #include "messages.h"
 #include "record_bodies.h"
+#include "sink.h"
 #include "trace_file_fmt.h"
 
 #include <cstring>
@@ -73,8 +74,10 @@ int format_record(trace_queue_element* pProcessThisElement) {
                                 .bytes = bytes,
                                 .uTraceId =
                                     bHasTraceId ? load<uint32_t>(bytes, pKind->uTraceIdOffset) : 0};
-    if (write_body(record))
+    if (write_body(record)) {
+        output_abandon_rec(); // the state of its thread may go with the file
         return 1;
+    }
     output_end_rec();
     return 0;
 }

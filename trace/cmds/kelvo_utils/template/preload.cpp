@@ -4,6 +4,7 @@
 #include "store.h"
 #include "template_file.h"
 
+#include <cstdlib>
 #include <cstring>
 #include <dirent.h>
 #include <search.h>
@@ -71,7 +72,10 @@ void enter_file(const char* pName, const file_name_text& path) {
             return;
         pTemplate = pNew.release();
     }
-    std::memcpy(pTemplate->preload_path, path.text, path.uLength + 1);
+    if (char* const pPath = strdup(path.text); pPath != nullptr) {
+        std::free(pTemplate->preload_path);
+        pTemplate->preload_path = pPath;
+    }
 }
 
 void enter_directory(std::string_view directory) {
@@ -99,6 +103,8 @@ void template_file_init_walk_action(const void* pNode, VISIT visit, int /*depth*
     pTemplate->pNext = nullptr;
     pTemplate->lineNumber = 0;
     pTemplate->pFormats = nullptr;
+    if (pTemplate->preload_path == nullptr)
+        return;
     const file_owner pFile = open_template_file(pTemplate->preload_path);
     int insufficient_resources = 0;
     if (pFile != nullptr && read_template(pTemplate, pTemplate->preload_path, pFile.get(),

@@ -7,10 +7,12 @@
 #include <memory>
 #include <string_view>
 
-/// A file name that is put together from parts, always NUL-terminated. It never
-/// grows beyond what template_file::preload_path holds.
+/// Room for the name of a template file, with its NUL.
+inline constexpr size_t FILE_NAME_ROOM = 4096;
+
+/// A file name that is put together from parts, always NUL-terminated.
 struct file_name_text {
-    char text[sizeof(template_file::preload_path)] = "";
+    char text[FILE_NAME_ROOM] = "";
     size_t uLength = 0;
 
     /// Appends `part`; false, with the name unchanged, when it does not fit.

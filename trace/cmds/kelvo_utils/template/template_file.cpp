@@ -101,5 +101,6 @@ void release_formats(template_file* pTemplate) {
 
 void release_template(template_file* pTemplate) {
     release_formats(pTemplate);
+    std::free(pTemplate->preload_path);
     std::free(pTemplate);
 }
