@@ -59,6 +59,7 @@ std::vector<std::string> make_environment(const command_setup& setup) {
 
 std::vector<char*> pointers(std::vector<std::string>& texts) {
     std::vector<char*> result;
+    result.reserve(texts.size() + 1);
     for (std::string& sText : texts)
         result.push_back(sText.data());
     result.push_back(nullptr);
@@ -182,7 +183,7 @@ std::string live_command::read_line() {
     size_t uEnd;
     while ((uEnd = m_out.sText.find('\n')) == std::string::npos && m_out.fd >= 0)
         receive(iDeadline);
-    const std::string sLine = m_out.sText.substr(0, uEnd);
+    std::string sLine = m_out.sText.substr(0, uEnd);
     m_out.sText.erase(0, uEnd == std::string::npos ? uEnd : uEnd + 1);
     return sLine;
 }

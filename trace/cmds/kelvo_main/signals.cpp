@@ -33,6 +33,7 @@ constexpr int MOST_FORWARDED_FAULTS = 500;
 
 std::atomic<int> iPendingSignal{0};
 std::atomic<bool> bMainThreadWaits{false};
+std::atomic<int> iReaderFault{0}; // signal of a fault that recurs on another thread
 std::atomic<int> iForwardedFaults{0};
 static_assert(std::atomic<int>::is_always_lock_free && std::atomic<bool>::is_always_lock_free,
               "used in signal handlers");
@@ -58,11 +59,18 @@ void handle_terminating_signal(int signo) {
     iPendingSignal = signo;
 }
 
-/// Lets the signal have the effect that it had before the run: a fault recurs
-/// when the handler returns; a signal that was sent would not, and is repeated.
+/// Whether the signal comes from the instruction that the thread executes, and
+/// will come again; otherwise somebody has sent it.
+bool recurs(const siginfo_t* pInfo) {
+    return pInfo->si_code > 0;
+}
+
+/// Lets the signal have the effect that it had before the run. A fault takes it
+/// when it recurs, on the thread that is to blame; a signal that was sent is
+/// repeated.
 void restore_disposition(int signo, const siginfo_t* pInfo) {
     sigaction(signo, &anchor.origAction[signo], nullptr);
-    if (pInfo->si_code <= 0)
+    if (!recurs(pInfo) && iReaderFault != signo)
         raise(signo);
 }
 
@@ -83,6 +91,8 @@ void handle_fault(int signo, const siginfo_t* pInfo) {
         return;
     }
     end_this_reader();
+    if (recurs(pInfo))
+        iReaderFault = signo;
     if (++iForwardedFaults > MOST_FORWARDED_FAULTS) {
         restore_disposition(signo, pInfo);
         return;
