@@ -39,6 +39,18 @@ bool make_directory(const std::string& path) {
     return !error;
 }
 
+/// Other traces in the directory would be printed along.
+void warn_of_others(const sample_options& options, size_t uOwn) {
+    size_t uTraces = 0;
+    std::error_code error;
+    for (std::filesystem::directory_iterator it(options.directory, error), end; !error && it != end;
+         it.increment(error))
+        uTraces += it->path().extension() == ".trc";
+    if (uTraces > uOwn)
+        fprintf(stderr, "kelvo_sample: note: %s holds %zu other trace%s, which are left alone\n",
+                options.directory.c_str(), uTraces - uOwn, uTraces - uOwn == 1 ? "" : "s");
+}
+
 const char* plural(uint64_t uNumber) {
     return uNumber == 1 ? "" : "s";
 }
@@ -77,6 +89,7 @@ int make_sample(const sample_options& options) {
                            : make_profile(options, pLive, &files);
     if (!bGood)
         return 1;
+    warn_of_others(options, files.size());
     if (options.bLive)
         report_live(files);
     else

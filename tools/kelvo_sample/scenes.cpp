@@ -37,6 +37,9 @@ constexpr customer CUSTOMERS[] = {{"E. Lindqvist", "10.0.4.17", 'A', 70412, 3.2F
                                   {"M. Sarrazin", "10.0.7.66", 'A', 69075, 5.0F},
                                   {"T. Brandvold", "10.0.2.140", 'C', 71533, 27.4F}};
 
+constexpr std::string_view NOTES[] = {"leave at the door", "a gift", "call first", "no hurry"};
+constexpr uint32_t ORDERS_PER_PAGE = 8;
+
 template <class T, size_t N> const T& one_of(service& s, const T (&table)[N]) {
     return table[s.random.below(N)];
 }
@@ -52,6 +55,15 @@ struct order {
         ++s.uRequests;
     }
 
+    /// The request has come.
+    void begin(const service& s) {
+        uBegan = s.now();
+    }
+
+    double milliseconds_taken(const service& s) const {
+        return static_cast<double>(s.now() - uBegan) / 1e6;
+    }
+
     double total() const {
         return uQuantity * theProduct.price;
     }
@@ -63,24 +75,26 @@ struct order {
     uint32_t uWorker;
     std::string sName;
     std::string sKey;
+    uint64_t uBegan = 0;
     voice gwy;
     voice ord;
     voice sto;
 };
 
-void play_request(service& s, const order& o) {
+void play_request(service& s, order& o) {
     const customer& c = o.theCustomer;
-    o.gwy.strings(900, GWY_REQUEST, {"POST", "/orders"});
-    o.gwy.uint32_2(11, GWY_REQUEST_ID, static_cast<uint32_t>(s.random.next()),
-                   180 + s.random.below(300));
+    o.gwy.strings(130'000 + s.random.below(90'000), GWY_REQUEST, {"POST", "/orders"});
+    o.begin(s);
+    const auto uRequestId = static_cast<uint32_t>(s.random.next());
+    o.gwy.uint32_2(11, GWY_REQUEST_ID, uRequestId, 180 + s.random.below(300));
     o.gwy.data(14, GWY_CLIENT, {block(c.address), block(c.cClass), block(c.fDistance)});
     o.gwy.strings(9, GWY_ASK, {"order service"});
     o.ord.uint32(61, ORD_PLACE, o.uNumber);
     o.ord.data(12, ORD_CUSTOMER,
                {block(c.name), sample_bytes().add_long(c.iNumber, s.options.uAddrBits)});
-    o.ord.data(
-        8, ORD_ITEM,
-        {block(static_cast<int8_t>(o.uQuantity)), block(o.theProduct.name), block(o.total())});
+    o.ord.data(8, ORD_ITEM,
+               {block(static_cast<int8_t>(o.uQuantity)), block(o.theProduct.name),
+                block(o.theProduct.price)});
 }
 
 void play_reservation(service& s, const order& o, int iLeft) {
@@ -91,24 +105,46 @@ void play_reservation(service& s, const order& o, int iLeft) {
     o.ord.int32_2(43, ORD_RESERVED, -static_cast<int32_t>(o.uQuantity), iLeft);
 }
 
-/// The journal entry of an order: its number, the order, a note, the head of
-/// the page as it is.
+/// The journal entry of an order: its number, the order, a note, and for the
+/// first order of a page the head of that page as it is.
 void write_journal(service& s, const order& o) {
     sample_bytes packed = block(o.uNumber, static_cast<int16_t>(o.uQuantity), o.theCustomer.cClass);
     packed.align(8).add(o.total());
+    const sample_bytes entry = block(uint32_t{9000} + s.uRequests);
+    const sample_bytes note = block(one_of(s, NOTES));
+    if (s.uRequests % ORDERS_PER_PAGE != 1) {
+        o.sto.data(16, STO_JOURNAL, {entry, packed, note});
+        return;
+    }
     const sample_bytes head = block("PAGE", uint8_t{2}, uint16_t{0x0110}, o.uNumber,
                                     static_cast<uint32_t>(s.random.next()));
-    o.sto.data(16, STO_JOURNAL,
-               {block(uint32_t{9000} + s.uRequests), packed, block("leave at the door"), head});
+    o.sto.data(16, STO_JOURNAL, {entry, packed, note, head});
+}
+
+void say_volume_full(const voice& sto, int iPagesNeeded) {
+    cu_error_arg_t args[2] = {};
+    args[0].cu_arg_type = CU_ERROR_ARG_CHAR_STR;
+    args[0].cu_arg_value.cu_arg_char_str = "data1";
+    args[1].cu_arg_type = CU_ERROR_ARG_INT;
+    args[1].cu_arg_value.cu_arg_int = iPagesNeeded;
+    trace_error_content error;
+    error.traceId = STO_ERROR;
+    error.errorId = 28;
+    error.lineNumber = 412;
+    error.funcName = "grow_volume";
+    error.fileName = "volume.c";
+    error.ffdcId = "7K2Q-0314-A";
+    error.msgSetNumber = 1;
+    error.msgNumber = 12;
+    error.msgCatName = "storaged.cat";
+    error.defMsg = "volume %s is full, %d pages needed";
+    error.args = args;
+    sto.error(410, error);
 }
 
 void play_answer(const order& o, double milliseconds, int iStatus, gateway_id reason) {
     o.gwy.data(58, GWY_ANSWERED, {block(milliseconds)});
     o.gwy.int32_2(13, GWY_STATUS, iStatus, static_cast<int32_t>(reason));
-}
-
-double milliseconds_since(const service& s, uint64_t uThen) {
-    return static_cast<double>(s.now() - uThen) / 1e6;
 }
 
 } // namespace
@@ -134,8 +170,7 @@ void play_opening(service& s, int iSegments) {
 }
 
 void play_order(service& s, bool bProbe) {
-    const order o(s);
-    const uint64_t uStart = s.now();
+    order o(s);
     play_request(s, o);
     play_reservation(s, o, 8 + static_cast<int>(s.random.below(20)));
     o.ord.id(9, ORD_STORE);
@@ -147,45 +182,30 @@ void play_order(service& s, bool bProbe) {
     o.sto.uint64(210, STO_WRITTEN, s.random.next());
     o.ord.uint64(47, ORD_STORED, 1 + s.random.below(3));
     o.ord.data(10, ORD_COMPLETE, {block(o.total())});
-    play_answer(o, milliseconds_since(s, uStart), 201, GWY_REASON_CREATED);
+    play_answer(o, o.milliseconds_taken(s), 201, GWY_REASON_CREATED);
 }
 
 void play_refusal(service& s) {
-    const order o(s);
-    const uint64_t uStart = s.now();
+    order o(s);
     ++s.uFailed;
     play_request(s, o);
-    const int iLeft = 8 + static_cast<int>(s.random.below(20));
-    play_reservation(s, o, iLeft);
+    play_reservation(s, o, 8 + static_cast<int>(s.random.below(20)));
     o.ord.id(9, ORD_STORE);
     o.sto.strings(57, STO_WRITE, {o.sName});
     o.sto.uint32(30, STO_FILL, 100);
-
-    const uint32_t uNeeded = 2 + s.random.below(7);
-    cu_error_arg_t args[2] = {};
-    args[0].cu_arg_type = CU_ERROR_ARG_CHAR_STR;
-    args[0].cu_arg_value.cu_arg_char_str = "data1";
-    args[1].cu_arg_type = CU_ERROR_ARG_INT;
-    args[1].cu_arg_value.cu_arg_int = static_cast<int32_t>(uNeeded);
-    trace_error_content error;
-    error.traceId = STO_ERROR;
-    error.errorId = 28;
-    error.lineNumber = 412;
-    error.funcName = "grow_volume";
-    error.fileName = "volume.c";
-    error.ffdcId = "7K2Q-0314-A";
-    error.msgSetNumber = 1;
-    error.msgNumber = 12;
-    error.msgCatName = "storaged.cat";
-    error.defMsg = "volume %s is full, %d pages needed";
-    error.args = args;
-    o.sto.error(410, error);
+    say_volume_full(o.sto, 2 + static_cast<int>(s.random.below(7)));
     o.sto.id(12, STO_FAILED);
     o.ord.id(44, ORD_NOT_STORED);
     o.ord.data(15, ORD_GIVE_BACK,
                {block(static_cast<int8_t>(o.uQuantity)), block(o.theProduct.name)});
     o.ord.int32(9, ORD_REFUSED, 28);
-    play_answer(o, milliseconds_since(s, uStart), 503, GWY_REASON_LATER);
+    play_answer(o, o.milliseconds_taken(s), 503, GWY_REASON_LATER);
+
+    const auto uVolume = static_cast<uint32_t>(s.random.next());
+    const voice sto(s, STORAGE, STORAGE_MAIN);
+    sto.data(35'000, STO_GROWN,
+             {block("data1"), block(512), block(4),
+              block(uint16_t{0x0021}, uint16_t{0xffff}, uVolume, 1U, 0U, o.uNumber)});
 }
 
 void play_health(service& s) {

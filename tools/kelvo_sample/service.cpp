@@ -23,6 +23,7 @@ bool service::take_turn(service_program program, uint32_t uDelay, uint64_t* pTim
     *pTime = uNow;
     if (pLive != nullptr && !pLive->next(pTime))
         bEnd = true;
+    uNow = *pTime;
     return !bEnd;
 }
 

@@ -10,7 +10,7 @@ constexpr uint64_t LIVE_FILE_SIZE = 1 << 20;
 /// In the story as it is told the storage daemon has written more than its ring
 /// holds.
 constexpr uint64_t TOLD_FILE_SIZE = 8192;
-constexpr uint64_t TOLD_WRAPPED_SIZE = 2048;
+constexpr uint64_t TOLD_WRAPPED_SIZE = 1856;
 constexpr int TOLD_SEGMENTS = 48;
 constexpr int SHORT_SEGMENTS = 3;
 /// More than records take on the average, and than the longest ones add.

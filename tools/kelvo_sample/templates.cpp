@@ -45,8 +45,8 @@ constexpr char ORDERS[] = R"tpl(# Order service: checks orders, reserves stock, 
 
 0x10 ">>order %u"
 0x11 "customer %s, no. %ld"
-0x12 "%2d x %-14s %9.2f"
-0x13 "<<complete, %18.2f"
+0x12 "%d x %-13s at %6.2f"
+0x13 "<<complete, %.2f"
 0x14 "<<refused, reason %d"
 
 0x20 ">>reserve %s"
@@ -54,14 +54,7 @@ constexpr char ORDERS[] = R"tpl(# Order service: checks orders, reserves stock, 
 0x22 ">>store it"
 0x23 "<<stored as revision %llu"
 0x24 "<<not stored"
-0x25 "try %d of %d failed, again in 2 ms"
-0x26 "gave back %d of %s"
-
-# Errors have six parameters: number, function, line, file, message, FFDC id.
-0x30 "error %d from %s,\n"          # strings that follow each other
-     "  line %d of %s:\n"           # make one text
-     "  %s\n"
-     "  FFDC id %s"
+0x25 "gave back %d of %s"
 )tpl";
 
 constexpr char STORAGE[] = R"tpl(# Storage daemon: keeps pages and a journal.
@@ -78,15 +71,17 @@ constexpr char STORAGE[] = R"tpl(# Storage daemon: keeps pages and a journal.
 # blocks 1 and 2 have texts of their own, block 3 is shown as it is.
 0x20 ">>write %s"
 0x21 "journal entry %u"
-0x21:1 "  order %u, %hd items, class %c, %.2f"
+0x21:1 "  order %u, %hd pcs, class %c, %.2f"
 0x21:2 "  note \"%s\""
 0x22 "volume %u%% full"
 0x23 "<<written, checksum %016llx"
 0x24 "<<nothing written"
-0x25 "extent %*d of %r"
+0x25 "volume %s grown by %*d pages\n"   # value, then width
+     "%r"
 0x26 "%u reads, %u writes, %u failed"
 
-# Parameters by number may stand in any order.
+# Errors have six parameters: number, function, line, file, message, FFDC id.
+# By number they may stand in any order. Strings behind each other are one text.
 0x30 "error %1$d in %2$s\n"
      "  (%4$s:%3$d)\n"
      "  %5$s\n"

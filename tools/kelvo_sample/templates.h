@@ -40,9 +40,7 @@ enum order_id : uint32_t {
     ORD_STORE = 0x22,
     ORD_STORED = 0x23,
     ORD_NOT_STORED = 0x24,
-    ORD_RETRY = 0x25,
-    ORD_GIVE_BACK = 0x26,
-    ORD_ERROR = 0x30,
+    ORD_GIVE_BACK = 0x25,
 };
 
 enum storage_id : uint32_t {
@@ -57,7 +55,7 @@ enum storage_id : uint32_t {
     STO_FILL = 0x22,
     STO_WRITTEN = 0x23,
     STO_FAILED = 0x24,
-    STO_HANDLE = 0x25,
+    STO_GROWN = 0x25,
     STO_TOTALS = 0x26,
     STO_ERROR = 0x30,
 };
