@@ -11,14 +11,11 @@ std::atomic<bool> bReadersMayRun{false};
 
 namespace {
 
-/// The files themselves were closed by their readers. One whose task was dropped
-/// with the pool is still mapped: the mapping goes with the process.
+/// The files themselves were closed by their readers.
 void release_files() {
     while (anchor.pFirstFile != nullptr) {
         trace_file* const pTraceFile = anchor.pFirstFile;
         anchor.pFirstFile = pTraceFile->pNext;
-        if (pTraceFile->pMapEnd != nullptr)
-            pTraceFile->pHeader = nullptr;
         release_trace_file(pTraceFile);
     }
     anchor.iNumberFiles = 0;

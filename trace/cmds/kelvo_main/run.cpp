@@ -19,14 +19,13 @@
 #include <cstdio>
 #include <cstdlib>
 #include <new>
-#include <unistd.h>
 
 namespace {
 
 TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;
 
 constexpr size_t PRELOAD_FROM_FILES = 50; // templates are read in advance from here on
-constexpr unsigned int LOW_MEMORY_PAUSE_S = 30;
+constexpr int64_t LOW_MEMORY_PAUSE_US = 30'000'000;
 
 // ------------------------------------------------------------ opening files
 
@@ -69,7 +68,7 @@ int open_file(const command_line& command, uint32_t fileIndex) {
         return 0;
     if (anchor.bFollow) {
         if (start_following(pTraceFile) != 0) {
-            free(pTraceFile);
+            release_trace_file(pTraceFile);
             return -1;
         }
     } else {
@@ -82,9 +81,11 @@ int open_file(const command_line& command, uint32_t fileIndex) {
 
 int open_files(const command_line& command) {
     int bError = 0;
-    for (uint32_t fileIndex = 0; fileIndex < command.files.size(); ++fileIndex)
+    for (uint32_t fileIndex = 0; fileIndex < command.files.size(); ++fileIndex) {
         if (open_file(command, fileIndex) != 0)
             bError = 1;
+        take_pending_signal();
+    }
     return bError;
 }
 
@@ -100,7 +101,7 @@ void print_sorted_files() {
                 static_cast<unsigned int>(elem.pTrcFile->index),
                 static_cast<unsigned long long>(elem.header.timeStamp), elem.pTrcFile->pName);
     }
-    sleep(LOW_MEMORY_PAUSE_S);
+    main_thread_sleep(LOW_MEMORY_PAUSE_US);
 }
 
 /// Arranges the files in time order and starts the reader of the first one.
@@ -159,7 +160,8 @@ int process_files(const command_line& command) {
 
 /// The end of every run that no signal ended.
 int end_run(int bError) {
-    if (endThrdPool())
+    bReadersMayRun = !endThrdPool();
+    if (!bReadersMayRun)
         TrcOutput_Q.release();
     cleanup(0);
     return bError;

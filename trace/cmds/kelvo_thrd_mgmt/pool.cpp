@@ -15,6 +15,7 @@
 #include "insufficient.h"
 #include "kelvo.h"
 #include "messages.h"
+#include "mutex.h"
 
 #include <algorithm>
 #include <csignal>
@@ -69,19 +70,6 @@ pthread_cond_t emptyCond = PTHREAD_COND_INITIALIZER; ///< the last thread has le
 
 thrd_task_list* const CLOSED_POOL = reinterpret_cast<thrd_task_list*>(~uintptr_t{0});
 
-/// Holds thrd_pool_mutex for the length of a scope.
-class pool_lock {
-public:
-    pool_lock() {
-        pthread_mutex_lock(&thrd_pool_mutex);
-    }
-    ~pool_lock() {
-        pthread_mutex_unlock(&thrd_pool_mutex);
-    }
-    pool_lock(const pool_lock&) = delete;
-    pool_lock& operator=(const pool_lock&) = delete;
-};
-
 // ------------------------------------------------- with thrd_pool_mutex held
 
 bool is_closed() {
@@ -132,7 +120,7 @@ bool wait_until(pthread_cond_t& cond, const timespec& moment) {
 /// Takes the next task into *ppTask. Returns 1 when there was one, 0 when the
 /// queue is empty, -1 when the pool is closed.
 int threadWaitForNextTask(thrd_task** ppTask) {
-    const pool_lock lock;
+    const mutex_guard lock(thrd_pool_mutex);
     *ppTask = nullptr;
     if (is_closed())
         return -1;
@@ -148,7 +136,7 @@ int threadWaitForNextTask(thrd_task** ppTask) {
 /// Sleeps until there may be something to do: at most `iInterval` microseconds
 /// for the thread that becomes the lookout.
 void wait_for_news(int64_t iInterval) {
-    const pool_lock lock;
+    const mutex_guard lock(thrd_pool_mutex);
     if (is_closed() || task_queue->pFirstTask != nullptr)
         return;
     if (bLookoutPosted) {
@@ -167,12 +155,12 @@ void run_task(thrd_task* pTask, pthread_t self) {
         pool_task_main(task->pTask);
         task->pServiceThrdId->store(0);
     }
-    const pool_lock lock;
+    const mutex_guard lock(thrd_pool_mutex);
     ++totalFreeThrdsInPool;
 }
 
 void leave_pool() {
-    const pool_lock lock;
+    const mutex_guard lock(thrd_pool_mutex);
     --totalFreeThrdsInPool;
     if (--totalThrdsInPool == 0)
         pthread_cond_signal(&emptyCond);
@@ -248,7 +236,7 @@ int addThreadsToPool(int iCount) {
                 totalThrdsInPool.load(), totalFreeThrdsInPool.load());
     int iResult = -1;
     {
-        const pool_lock lock;
+        const mutex_guard lock(thrd_pool_mutex);
         if (totalFreeThrdsInPool >= FEWEST_FREE_THREADS)
             iResult = 0;
         else if (!is_closed())
@@ -274,7 +262,7 @@ int poolAddNewTask(std::atomic<pthread_t>* pServiceThrdId, void* pTask) {
         warn_insufficient_resources_during_open("malloc()", sizeof(thrd_task));
         return -1;
     }
-    const pool_lock lock;
+    const mutex_guard lock(thrd_pool_mutex);
     if (is_closed())
         return -1;
     append_task(task.release());
@@ -283,7 +271,7 @@ int poolAddNewTask(std::atomic<pthread_t>* pServiceThrdId, void* pTask) {
 }
 
 bool endThrdPool() {
-    const pool_lock lock;
+    const mutex_guard lock(thrd_pool_mutex);
     if (!is_closed())
         close_pool();
     const timespec moment = after(CLOSE_ATTEMPTS * CLOSE_INTERVAL);

@@ -72,7 +72,8 @@ void close_trace_file(trace_file* pTraceFile, int bSigActive) {
 void release_trace_file(trace_file* pTraceFile) {
     if (pTraceFile == nullptr)
         return;
-    free(pTraceFile->pHeader);
+    if (pTraceFile->pMapEnd == nullptr) // else a mapping, which goes with the process
+        free(pTraceFile->pHeader);
     pthread_mutex_destroy(&pTraceFile->queueMutex);
     free(pTraceFile);
 }
