@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <ctime>
 #include <thread>
+#include <utility>
 
 namespace {
 
@@ -29,10 +30,11 @@ uint64_t time_of_day() {
     return static_cast<uint64_t>(now.tv_sec) * 1'000'000'000 + static_cast<uint64_t>(now.tv_nsec);
 }
 
-live_pace::live_pace(const sample_options& options)
+live_pace::live_pace(const sample_options& options, std::string announcement)
     : uRate(options.uRate * options.uFiles), started(clock::now()),
       ends(options.uSeconds != 0 ? started + std::chrono::seconds(options.uSeconds)
-                                 : clock::time_point::max()) {
+                                 : clock::time_point::max()),
+      sAnnouncement(std::move(announcement)) {
     bStop = 0;
     struct sigaction action {};
     action.sa_handler = stop;
@@ -45,6 +47,11 @@ bool live_pace::is_over(clock::time_point now) const {
 }
 
 bool live_pace::next(uint64_t* pWallTime) {
+    if (!sAnnouncement.empty()) {
+        fputs(sAnnouncement.c_str(), stdout);
+        fflush(stdout);
+        sAnnouncement.clear();
+    }
     if (bStop != 0)
         return false;
     if (uRate == 0) {

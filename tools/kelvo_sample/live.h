@@ -11,7 +11,8 @@
 /// is one at a time. Used by one thread.
 class live_pace {
 public:
-    explicit live_pace(const sample_options& options);
+    /// `announcement` is printed when the files are there, with the first record.
+    live_pace(const sample_options& options, std::string announcement);
 
     /// The files to be polled; they must outlive the pace's use.
     void add(sample_file* pFile) {
@@ -31,7 +32,8 @@ private:
     std::vector<sample_file*> files;
     uint64_t uRate; ///< of all files together, records per second; 0: no pause
     clock::time_point started;
-    clock::time_point ends; ///< time_point::max(): not by itself
+    clock::time_point ends;    ///< time_point::max(): not by itself
+    std::string sAnnouncement; ///< until it is printed
     uint64_t uDone = 0;
     uint64_t uLastTime = 0;
 };

@@ -76,12 +76,10 @@ int make_sample(const sample_options& options) {
     if (!make_directory(options.directory) || !write_templates(options.directory, options.profile))
         return 1;
     std::optional<live_pace> pace;
-    if (options.bLive) {
-        printf("Appending to %u trace%s; watch with: %s\n", options.uFiles, plural(options.uFiles),
-               kelvo_command(options, "-f ").c_str());
-        fflush(stdout);
-        pace.emplace(options);
-    }
+    if (options.bLive)
+        pace.emplace(options, "Appending to " + std::to_string(options.uFiles) + " trace" +
+                                  plural(options.uFiles) +
+                                  "; watch with: " + kelvo_command(options, "-f ") + "\n");
     sample_files files;
     live_pace* const pLive = pace ? &*pace : nullptr;
     const bool bGood = options.profile == sample_profile::STORY

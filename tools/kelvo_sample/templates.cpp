@@ -50,7 +50,7 @@ constexpr char ORDERS[] = R"tpl(# Order service: checks orders, reserves stock, 
 0x14 "<<refused, reason %d"
 
 0x20 ">>reserve %s"
-0x21 "<<%+d, %d left"
+0x21 "<<stock %+d, %d left"
 0x22 ">>store it"
 0x23 "<<stored as revision %llu"
 0x24 "<<not stored"
