@@ -22,6 +22,7 @@ struct prefix_source {
 // Most bytes of one field: a date or time of up to 39 and the nanoseconds.
 constexpr size_t FIELD_ROOM = 64;
 constexpr size_t PREFIX_ROOM = FIELD_ROOM * sizeof anchor.outputOptions;
+static_assert(PREFIX_ROOM <= STDOUT_ROOM);
 
 char* put_text(char* pOut, std::string_view text) {
     return std::copy(text.begin(), text.end(), pOut);
@@ -39,7 +40,7 @@ char* put_time(char* pOut, const prefix_source& source) {
 
 char* put_thread(char* pOut, const prefix_source& source) {
     pOut = put_text(pOut, " T(");
-    pOut = put_number(pOut, source.threadId, 16, 3, ' ');
+    pOut = put_hex(pOut, source.threadId, 3);
     *pOut++ = ')';
     return pOut;
 }
@@ -66,24 +67,37 @@ char* put_offset(char* pOut, const prefix_source& source) {
 
 // The fields by their -o letter. Each writes at most FIELD_ROOM bytes at `pOut`
 // and returns the position after them.
+using put_field = char* (*)(char* pOut, const prefix_source& source);
 struct prefix_field {
     char letter;
-    char* (*pPut)(char* pOut, const prefix_source& source);
+    put_field pPut;
 };
 constexpr prefix_field PREFIX_FIELDS[] = {
     {'d', put_date},     {'t', put_time},     {'i', put_thread}, {'c', put_component},
     {'f', put_function}, {'s', put_sequence}, {'o', put_offset},
 };
 
+// The fields that anchor.outputOptions asks for, looked up once.
+struct {
+    char letters[sizeof anchor.outputOptions] = "";
+    put_field pPuts[sizeof anchor.outputOptions];
+    size_t uCount = 0;
+} chosen;
+
+void choose_fields() {
+    std::memcpy(chosen.letters, anchor.outputOptions, sizeof chosen.letters);
+    chosen.uCount = 0;
+    for (const char* pLetter = chosen.letters; *pLetter != '\0'; pLetter++)
+        for (const prefix_field& field : PREFIX_FIELDS)
+            if (field.letter == *pLetter)
+                chosen.pPuts[chosen.uCount++] = field.pPut;
+}
+
 char* put_fields(char* pOut, const prefix_source& source) {
-    for (const char letter : anchor.outputOptions) {
-        if (letter == '\0')
-            break;
-        for (const prefix_field& field : PREFIX_FIELDS) {
-            if (field.letter == letter)
-                pOut = field.pPut(pOut, source);
-        }
-    }
+    if (std::memcmp(chosen.letters, anchor.outputOptions, sizeof chosen.letters) != 0)
+        choose_fields();
+    for (size_t i = 0; i < chosen.uCount; i++)
+        pOut = chosen.pPuts[i](pOut, source);
     return pOut;
 }
 
@@ -91,8 +105,7 @@ char* put_fields(char* pOut, const prefix_source& source) {
 constexpr int INDEX_COLUMNS = 4;
 
 void write_prefix(const trace_file* pTraceFile, const prefix_source& source) {
-    char prefix[PREFIX_ROOM];
-    char* pFields = prefix;
+    char* pFields = stdout_begin_room(PREFIX_ROOM);
     int columns = 0;
     if (anchor.iNumberFiles > 1) {
         *pFields++ = '[';
@@ -102,7 +115,7 @@ void write_prefix(const trace_file* pTraceFile, const prefix_source& source) {
     }
     char* pEnd = put_fields(pFields, source);
     columns += static_cast<int>(pEnd - pFields);
-    stdout_write({prefix, static_cast<size_t>(pEnd - prefix)});
+    stdout_end_room(pEnd);
     anchor.curColumn = static_cast<int16_t>(columns);
     anchor.headerIndent = static_cast<int16_t>(columns + 1);
 }

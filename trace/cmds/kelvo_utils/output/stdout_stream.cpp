@@ -62,6 +62,16 @@ void stdout_fill(char ch, size_t count) {
     }
 }
 
+char* stdout_begin_room(size_t count) {
+    if (count >= BUFFER_SIZE - stream.uUsed)
+        stdout_flush();
+    return stream.pBuffer + stream.uUsed;
+}
+
+void stdout_end_room(const char* pEnd) {
+    stream.uUsed = static_cast<size_t>(pEnd - stream.pBuffer);
+}
+
 void stdout_flush() {
     if (stream.iError == 0)
         stream.iError = write_all(STDOUT_FILENO, {stream.pBuffer, stream.uUsed});

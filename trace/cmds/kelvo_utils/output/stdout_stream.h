@@ -20,6 +20,12 @@ void stdout_write(std::string_view text);
 /// Appends `ch` `count` times.
 void stdout_fill(char ch, size_t count);
 
+/// Room for `count` bytes, at most STDOUT_ROOM, that the caller fills in place
+/// and then passes their end to stdout_end_room. No newline may be among them.
+inline constexpr size_t STDOUT_ROOM = 4096;
+char* stdout_begin_room(size_t count);
+void stdout_end_room(const char* pEnd);
+
 /// Writes everything appended so far. Interrupted and partial writes go on
 /// where they stopped. After the first failed write the stream drops all text.
 void stdout_flush();
