@@ -8,6 +8,7 @@
 #include "output_queue.h"
 #include "pool.h"
 #include "progress.h"
+#include "record_copy.h"
 #include "start.h"
 #include "walk.h"
 
@@ -15,7 +16,6 @@
 #include <array>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <unistd.h>
 
 namespace {
@@ -116,31 +116,6 @@ int push_batch(trace_file* pTraceFile, record_batch& batch) {
     return bFailed ? -1 : 0;
 }
 
-/// Copies the record at pCurRec, whose header was judged as `header`. The copy
-/// frees the record in the mapping, which the writer may overwrite. A record
-/// that ends beyond the mapping is copied as far as it is there. Null when
-/// memory ran out (reported).
-trace_queue_element* copy_record(trace_file* pTraceFile, const trace_record_header& header) {
-    const trace_bytes record = record_bytes(pTraceFile, pTraceFile->pCurRec, header.length);
-    const size_t uSize = record.size() + QUEUE_ELEMENT_OVERHEAD;
-    auto* const pElement = static_cast<trace_queue_element*>(malloc(uSize));
-    if (pElement == nullptr) {
-        warn_insufficient_resources(pTraceFile->pName, static_cast<int64_t>(uSize));
-        return nullptr;
-    }
-    constexpr size_t HEAD = offsetof(trace_queue_element, header);
-    auto* const pBytes = reinterpret_cast<std::byte*>(pElement);
-    memset(pBytes, 0, HEAD);
-    memcpy(pBytes + HEAD, record.data(), record.size());
-    memset(pBytes + HEAD + record.size(), 0, uSize - HEAD - record.size());
-    pElement->header = header;
-    pElement->header.length = static_cast<uint32_t>(record.size());
-    pElement->pFile = pTraceFile;
-    pElement->offset = get_record_offset(pTraceFile, pTraceFile->pCurRec);
-    pElement->length = static_cast<uint32_t>(uSize);
-    return pElement;
-}
-
 /// Queues the record at pCurRec. Returns 0, or -1 when memory ran out.
 int queue_record_for_formating(trace_file* pTraceFile, const trace_record_header& header,
                                record_batch& batch) {
@@ -154,11 +129,6 @@ int queue_record_for_formating(trace_file* pTraceFile, const trace_record_header
 }
 
 // ------------------------------------------------------------------ reading
-
-/// Kinds that are handed on for output; the others are only stepped over.
-bool is_for_output(const trace_record_header& header) {
-    return header.function >= TRC_FUNC_ID && header.function <= TRC_FUNC_TIME_CALIBRATION;
-}
 
 /// Makes the handshake and stands on the first record. Returns 0, or -1 when
 /// the file is corrupt.

@@ -1,17 +1,14 @@
 #include "open.h"
 
-#include "first_record.h"
+#include "accept.h"
 #include "insufficient.h"
 #include "mapping.h"
 #include "messages.h"
 #include "mutex.h"
-#include "platform.h"
 #include "print.h"
-#include "ring.h"
 #include "start.h"
 #include "summary.h"
 #include "usage.h"
-#include "walk.h"
 
 #include <cstdlib>
 #include <cstring>
@@ -66,16 +63,6 @@ header_copy_ptr make_header_copy(const char* pName, const trace_file_header& hea
     return header_copy_ptr(new (pBlock) trace_file_header(header));
 }
 
-bool header_is_valid(const trace_file_header& header, const trace_file* pTraceFile) {
-    if (header.uVersion == VERSION_WITH_BASE_PROG_NAME &&
-        (is_BE_unix_platform(header.uPlatform) || is_BE_linux_platform(header.uPlatform)) &&
-        header.uOffset != sizeof(trace_file_header))
-        return false;
-    return (header.uProperties & TRC_PROP_RESERVED) == 0 &&
-           is_compatible_platform_to_run(header.uPlatform) && header.uVersion <= TRC_MAX_VERSION &&
-           header.uActualFileSize == pTraceFile->uSize;
-}
-
 int not_a_trace_file(const char* pName) {
     output_err_message("%s: 2625-107 File \"%s\" is not a valid trace file.\n", anchor.pProgName,
                        pName);
@@ -88,17 +75,6 @@ int list_base_program_name(const trace_file_header& header) {
         return -1;
     print_base_program_name(header);
     return 0;
-}
-
-/// Takes what the record and the list element keep of the header and the first
-/// record of the area.
-void take_header(trace_file* pTraceFile, const trace_file_header& header,
-                 TrcPreProcHdrElem* pElem) {
-    pTraceFile->timeInfo = header.timeInfo;
-    pTraceFile->uPlatform = header.uPlatform;
-    pTraceFile->addrMode64 = (header.uProperties & TRC_PROP_ADDR_64) != 0;
-    pElem->header = read_record_header(pTraceFile->pWrap);
-    pElem->bOldestKnown = !anchor.bFollow && oldest_record_time(pTraceFile, &pElem->oldestTime);
 }
 
 /// The first file argument sets the time zone, and only then is the -s argument
@@ -139,14 +115,14 @@ int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrEl
 
     trace_file_header header; // the writer may change the mapped one at any time
     memcpy(&header, pTraceFile->pHeader, sizeof(header));
-    if (!header_is_valid(header, pTraceFile.get()))
+    if (!header_is_valid(header, pTraceFile->uSize))
         return not_a_trace_file(pName);
     if (bPrBaseProgName)
         return list_base_program_name(header);
     header_copy_ptr pCopy = make_header_copy(pName, header);
     if (pCopy == nullptr)
         return -1;
-    if (!ring_holds_header(pTraceFile.get(), ring_start(pTraceFile.get())))
+    if (!record_area_is_usable(pTraceFile.get()))
         return not_a_trace_file(pName);
     pTraceFile->bAccepted = 1;
 
