@@ -13,7 +13,7 @@ cd "$work"
 mkdir -p dirs/alpha dirs/beta
 touch a.trc
 
-# shellcheck source=../../completions/kelvo.bash
+# shellcheck disable=SC1091  # it is checked by itself
 . "$completions/kelvo.bash"
 
 # offers "WORDS" EXPECTED...: what is offered for the last word.
