@@ -65,8 +65,14 @@ struct conv_spec {
 /// Bits of format_entry::properties.
 enum : int32_t { FORMAT_NUMBERED_PARMS = 1 };
 
+/// Literal text of a format string as it is written: "%%" as one percent sign.
+struct format_piece {
+    const char* pText;
+    size_t uLength;
+};
+
 /// A compiled format string. One allocation holds the entry, its conversions,
-/// its parameter types and its string.
+/// its parameter types, its string, and its literal pieces with their text.
 struct format_entry {
     format_entry* pNext;     ///< next entry of the same file, older
     template_file* pFile;    ///< owner; null for an internal format
@@ -78,6 +84,10 @@ struct format_entry {
     int32_t numConvs;        ///< conversions, in order of appearance
     conv_spec* pConvSpecs;   ///< numConvs conversions
     char* pString;           ///< the whole format string, NUL-terminated
+
+    // Not part of the format of the record, but kept beside it:
+    format_piece* pPieces; ///< numConvs + 1: before each conversion, and after the last one
+                           ///< (there without a newline at the very end)
 };
 
 /// The formats of one component.

@@ -109,15 +109,6 @@ struct format_run {
     }
 };
 
-/// Literal text holds percent signs in pairs only; a pair is written as one.
-void write_literal(text_run& out, std::string_view text) {
-    for (size_t uPercent; (uPercent = text.find('%')) != text.npos;) {
-        out.add(text.substr(0, uPercent + 1));
-        text.remove_prefix(std::min(uPercent + 2, text.size()));
-    }
-    out.add(text);
-}
-
 std::string_view parm_string(const parm_ref& parm) {
     if (parm.bytes.empty())
         return {};
@@ -324,17 +315,13 @@ void bld_parm_list_unpacked(const format_entry* pFormatEntry, trace_bytes* pBloc
 
 void format_parms(const format_entry* pFormatEntry, const parm_list* pList, int bAddr64) {
     format_run run{.pEntry = pFormatEntry, .pList = pList, .bAddr64 = bAddr64, .out = {}};
-    const char* pCursor = pFormatEntry->pString;
+    const format_piece* pPiece = pFormatEntry->pPieces;
     for (const conv_spec& place :
          std::span(pFormatEntry->pConvSpecs, static_cast<size_t>(pFormatEntry->numConvs))) {
-        const char* pConversion = pFormatEntry->pString + place.offset;
-        write_literal(run.out, {pCursor, static_cast<size_t>(pConversion - pCursor)});
+        run.out.add(std::string_view(pPiece->pText, pPiece->uLength));
+        ++pPiece;
         write_conversion(run, place);
-        pCursor = pConversion + place.lenConv;
     }
-    std::string_view tail(pCursor);
-    if (tail.ends_with('\n'))
-        tail.remove_suffix(1); // the newline below stands for it
-    write_literal(run.out, tail);
+    run.out.add(std::string_view(pPiece->pText, pPiece->uLength));
     run.out.add('\n');
 }

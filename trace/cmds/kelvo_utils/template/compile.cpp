@@ -239,9 +239,40 @@ bool scan_format(format_scan& scan) {
     return true;
 }
 
+/// Copies literal text to `pOut`, a pair of percent signs as one; returns the end.
+char* copy_literal(char* pOut, std::string_view text) {
+    for (size_t i = 0; i < text.size(); ++i) {
+        *pOut++ = text[i];
+        if (text[i] == '%')
+            ++i;
+    }
+    return pOut;
+}
+
+/// Fills the entry's pieces; their text goes to `pText`.
+void lay_out_pieces(format_entry& entry, char* pText) {
+    const char* pCursor = entry.pString;
+    for (int i = 0; i <= entry.numConvs; ++i) {
+        const bool bLast = i == entry.numConvs;
+        const char* const pEnd =
+            bLast ? pCursor + std::strlen(pCursor) : entry.pString + entry.pConvSpecs[i].offset;
+        std::string_view literal(pCursor, static_cast<size_t>(pEnd - pCursor));
+        if (bLast && literal.ends_with('\n'))
+            literal.remove_suffix(1); // every text is ended with a newline of its own
+        char* const pTextEnd = copy_literal(pText, literal);
+        entry.pPieces[i] = {pText, static_cast<size_t>(pTextEnd - pText)};
+        pText = pTextEnd;
+        if (!bLast)
+            pCursor = pEnd + entry.pConvSpecs[i].lenConv;
+    }
+}
+
+constexpr size_t round_up(size_t uValue, size_t uMultiple) {
+    return (uValue + uMultiple - 1) / uMultiple * uMultiple;
+}
+
 /// Moves what was found into one block: the entry, its conversions, its type
-/// codes, its string. Each part needs no stricter alignment than the one before
-/// it, so nothing is padded. Null when memory is exhausted.
+/// codes, its string, its pieces and their text. Null when memory is exhausted.
 format_entry* make_entry(const format_scan& scan) {
     static_assert(sizeof(format_entry) % alignof(conv_spec) == 0);
     static_assert(sizeof(parm_type_t) == 1);
@@ -251,8 +282,10 @@ format_entry* make_entry(const format_scan& scan) {
     const size_t uConvsAt = sizeof(format_entry);
     const size_t uTypesAt = uConvsAt + uConvs * sizeof(conv_spec);
     const size_t uStringAt = uTypesAt + uParms;
+    const size_t uPiecesAt = round_up(uStringAt + uStringSize, alignof(format_piece));
+    const size_t uTextAt = uPiecesAt + (uConvs + 1) * sizeof(format_piece);
 
-    auto* const pBlock = static_cast<std::byte*>(std::malloc(uStringAt + uStringSize));
+    auto* const pBlock = static_cast<std::byte*>(std::malloc(uTextAt + uStringSize));
     if (pBlock == nullptr)
         return nullptr;
     auto* const pEntry = new (pBlock) format_entry{};
@@ -266,6 +299,8 @@ format_entry* make_entry(const format_scan& scan) {
     std::uninitialized_copy_n(scan.parmTypes, uParms, pEntry->pParmTypes);
     pEntry->pString = reinterpret_cast<char*>(pBlock + uStringAt);
     std::memcpy(pEntry->pString, scan.pString, uStringSize);
+    pEntry->pPieces = reinterpret_cast<format_piece*>(pBlock + uPiecesAt);
+    lay_out_pieces(*pEntry, reinterpret_cast<char*>(pBlock + uTextAt));
     return pEntry;
 }
 
