@@ -68,10 +68,10 @@ trace_writer_status trace_writer::begin(uint16_t function, const trace_origin& o
     const uint32_t uLength = (MIN_RECORD + static_cast<uint32_t>(bodySize) + 3) & ~3U;
 
     answer_reader();
-    bool bRoom = make_room(uLength);
+    bool bRoom = make_room(uLength, origin.timeStamp);
     if (!bRoom && forget_dead_reader()) {
         answer_reader();
-        bRoom = make_room(uLength);
+        bRoom = make_room(uLength, origin.timeStamp);
     }
     if (!bRoom) {
         if (bDamaged)
@@ -90,7 +90,6 @@ trace_writer_status trace_writer::begin(uint16_t function, const trace_origin& o
 }
 
 trace_writer_status trace_writer::commit() {
-    uLastTime = current.header.timeStamp;
     if (bHolding) {
         commit_held();
         return TRACE_WRITER_OK;
@@ -111,14 +110,16 @@ trace_writer_status trace_writer::commit() {
 
 // ------------------------------------------------------------------- places
 
-bool trace_writer::make_room(uint32_t uLength) {
+bool trace_writer::make_room(uint32_t uLength, uint64_t uTimeStamp) {
     if (bDamaged || (uDropsDue != 0 && !append_discard(uLength)))
         return false;
-    return place(uLength);
+    return place(uLength, uTimeStamp);
 }
 
-/// Finds the place of a record and stores the gap that will follow it.
-bool trace_writer::place(uint32_t uLength) {
+/// Finds the place of a record and stores the gap that will follow it, already
+/// with the record's time.
+bool trace_writer::place(uint32_t uLength, uint64_t uTimeStamp) {
+    uLastTime = uTimeStamp;
     if (bHolding)
         return place_held(uLength);
     swallow_first_filler();
@@ -162,7 +163,7 @@ bool trace_writer::append_discard(uint32_t uLengthAfter) {
             }
         }
     }
-    if (!place(MIN_RECORD))
+    if (!place(MIN_RECORD, lastDropped.timeStamp))
         return false;
     current.header =
         make_header(TRC_FUNC_DISCARDED,

@@ -249,14 +249,14 @@ private:
     trace_writer_status begin(uint16_t function, const trace_origin& origin, size_t bodySize,
                               std::byte** ppBody);
     trace_writer_status commit();
-    bool make_room(uint32_t uLength);
+    bool make_room(uint32_t uLength, uint64_t uTimeStamp);
     bool plan_room(uint64_t uLength, gap_plan* pPlan);
     bool plan_grown_gap(uint64_t uNeeded, gap_plan* pPlan);
     bool plan_head(uint64_t uNeeded, gap_plan* pPlan);
     bool swallow(uint32_t* pEnd, uint32_t uLimit, gap_plan* pPlan);
     void carry_out(const gap_plan& plan);
     void move_to_head(const gap_plan& plan);
-    bool place(uint32_t uLength);
+    bool place(uint32_t uLength, uint64_t uTimeStamp);
     bool append_discard(uint32_t uLengthAfter);
     uint32_t seq_number_from(uint32_t uAt) const;
     bool reader_has_passed(uint32_t uSeqNumber) const;
@@ -286,7 +286,7 @@ private:
     uint32_t uWrite = 0;    ///< start of the gap = uOldestRecordOffset
     uint32_t uGapEnd = 0;   ///< where the gap ends
     uint32_t uNextSeq = 0;  ///< number of the next record
-    uint64_t uLastTime = 0; ///< time stamp of the newest record; fillers carry it
+    uint64_t uLastTime = 0; ///< of the newest record, placed or not; fillers carry it
     open_record current;
 
     bool bHolding = false;    ///< uTailReq is raised and acknowledged
