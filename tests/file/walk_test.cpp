@@ -153,6 +153,24 @@ TEST(Walk, steps_round_the_end_and_counts_what_takes_part_in_the_sequence) {
     EXPECT_EQ(record_bytes(&trace.file, trace.file.pMapEnd, 28).size(), 0U);
 }
 
+TEST(Walk, waits_for_a_number_only_on_the_newest_record) {
+    raw_trace raw(400);
+    raw.put(200, {.seqNumber = TRC_SEQ_FILLER, .body = raw_bytes(uint32_t{7})});
+    raw.header.uOldestRecordOffset = 232;
+    memory_trace trace(raw);
+    trace.stand_on(200);
+    trace_record_header header;
+    ASSERT_EQ(is_last_record(&trace.file, &header), WALK_RECORD);
+    EXPECT_FALSE(number_has_come(&trace.file, &header));
+    trace.put(200, {.seqNumber = 8, .body = raw_bytes(uint32_t{7})});
+    EXPECT_TRUE(number_has_come(&trace.file, &header));
+    EXPECT_EQ(header.seqNumber, 8U);
+    header.seqNumber = TRC_SEQ_FILLER;
+    trace.put(200, {.seqNumber = TRC_SEQ_FILLER, .body = raw_bytes(uint32_t{7})});
+    trace.file.pHeader->uOldestRecordOffset = 300; // no record but the newest has none
+    EXPECT_TRUE(number_has_come(&trace.file, &header));
+}
+
 TEST(Walk, ends_on_a_ring_of_fillers_and_notices_a_writer_that_goes_on) {
     raw_trace raw(400);
     raw.add_filler(100);

@@ -3,10 +3,10 @@
 //
 // No lock joins the two processes. What joins them is the order of single
 // 32-bit words (16 for uFlags):
-// - The writer fills a record and stores its seqNumber last (release); only
-//   then does it move uOldestRecordOffset past the record (release). A reader
-//   that sees the expected seqNumber, or the moved offset (both acquire), sees
-//   the whole record.
+// - The writer fills a record, then moves uOldestRecordOffset past it (release)
+//   and stores its seqNumber last (release). A reader that sees the moved offset
+//   (acquire) sees the whole record but its number; one that sees the number
+//   (acquire) sees the moved offset too.
 // - The reader is done with a record before it raises uSeqLock past it
 //   (release), which is the writer's permission to overwrite the record.
 //

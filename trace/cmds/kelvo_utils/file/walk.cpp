@@ -1,9 +1,11 @@
 // Two orders of reading matter here, both because the writer goes on meanwhile.
-// It writes a record at the oldest position first and moves uOldestRecordOffset
-// past it afterwards; so the offset is read before the record: a record found
-// behind a moved offset is then complete, and one found at the offset is
-// complete when its seqNumber is the expected one, which is read before the
-// rest of it.
+// It writes a record at the oldest position, then moves uOldestRecordOffset past
+// it and stores the record's seqNumber last. The offset is read before the
+// record: a record found behind a moved offset is then complete but for its
+// number (see number_has_come), and one found at the offset is complete when its
+// seqNumber is the expected one, which is read before the rest of it. Whoever
+// has seen the number sees the moved offset, so a step past the record never
+// leads over the gap behind it.
 #include "walk.h"
 
 #include "corruption.h"
@@ -107,6 +109,18 @@ walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pH
     if (uOffset == uOldest && has_caught_up(pTraceFile, *pHeader))
         return WALK_NO_RECORD;
     return WALK_RECORD;
+}
+
+bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader) {
+    if (pHeader->seqNumber != TRC_SEQ_FILLER || pHeader->function == TRC_FUNC_FILLER) [[likely]]
+        return true;
+    // The number stands there once the offset has moved beyond the next record.
+    const uint64_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
+    pHeader->seqNumber = read_record_header(pTraceFile->pCurRec).seqNumber;
+    uint64_t uEnd = ring_offset(pTraceFile, pTraceFile->pCurRec) + pHeader->length;
+    if (uEnd == ring_end(pTraceFile))
+        uEnd = ring_start(pTraceFile);
+    return pHeader->seqNumber != TRC_SEQ_FILLER || uEnd != uOldest;
 }
 
 walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current) {

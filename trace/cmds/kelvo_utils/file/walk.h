@@ -49,6 +49,12 @@ enum walk_result : int {
 /// same position any number of times.
 walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader);
 
+/// Whether the record at pCurRec, found readable and copied to `pHeader`, has
+/// its seqNumber: the writer stores it a moment after the record can be read.
+/// Reads it again if it was not there. Asked again, in the end always true, but
+/// for a writer that was killed in that moment.
+bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader);
+
 /// Steps past the record at pCurRec, which is_last_record has just found
 /// readable and copied to `current`; the step goes by that copy. Returns
 /// WALK_RECORD, or WALK_CORRUPT when the new position is bad. Raises uSeqLock
