@@ -25,6 +25,8 @@ TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;
 constexpr int64_t FULL_QUEUE_WAIT_NS = 500'000;
 constexpr int64_t HELD_BACK_WAIT_NS = 10'000'000; // woken earlier when the room is there
 constexpr useconds_t FOLLOW_WAIT_US = 100'000;
+constexpr useconds_t NUMBER_WAIT_US = 100;
+constexpr int NUMBER_WAITS = 50; // a writer that was killed stores no number any more
 
 /// More files than this at once do not make a file's share of the cap smaller.
 constexpr uint32_t MAX_SHARES = 64;
@@ -142,6 +144,13 @@ int begin_reading(trace_file* pTraceFile) {
     return iResult;
 }
 
+/// Gives the writer the moment that it takes from making a record readable to
+/// storing its sequence number.
+void wait_for_number(const trace_file* pTraceFile, trace_record_header& header) {
+    for (int i = 0; i < NUMBER_WAITS && !number_has_come(pTraceFile, &header); ++i)
+        usleep(NUMBER_WAIT_US);
+}
+
 void read_records(trace_file* pTraceFile, record_batch& batch) {
     while (!pTraceFile->bDone) {
         trace_record_header header;
@@ -154,9 +163,11 @@ void read_records(trace_file* pTraceFile, record_batch& batch) {
             usleep(FOLLOW_WAIT_US);
             continue;
         }
-        if (is_for_output(header) && start_is_reached(pTraceFile, header) &&
-            queue_record_for_formating(pTraceFile, header, batch) != 0)
-            return;
+        if (is_for_output(header) && start_is_reached(pTraceFile, header)) {
+            wait_for_number(pTraceFile, header);
+            if (queue_record_for_formating(pTraceFile, header, batch) != 0)
+                return;
+        }
         if (step_to_next_record(pTraceFile, header) == WALK_CORRUPT)
             return;
     }
