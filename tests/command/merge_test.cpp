@@ -10,10 +10,12 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <csignal>
 #include <cstring>
 #include <fcntl.h>
 #include <map>
 #include <random>
+#include <set>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -136,6 +138,23 @@ TEST_F(Merge, SixtyFilesAtOnce) {
     const command_result result = run();
     EXPECT_EQ(result.status, 0);
     expect_merged(parse_printed(result.sOut), 60, 1500);
+}
+
+TEST_F(Merge, FollowModeReadsEveryFileHoweverManyThereAre) {
+    constexpr uint32_t FILES = 60;
+    for (uint32_t uFile = 0; uFile < FILES; ++uFile)
+        make(uFile, {sample_uint32(uFile, 1, 0xF000 + uFile)});
+    std::vector<std::string> arguments{"-f", "-r", "-s", "+0r"};
+    arguments.insert(arguments.end(), m_paths.begin(), m_paths.end());
+    live_command kelvo(arguments);
+    std::set<std::string> lines;
+    while (lines.size() < FILES) {
+        const std::string sLine = kelvo.read_line_with("val=0x0000f0");
+        ASSERT_NE(sLine, "");
+        lines.insert(sLine);
+    }
+    kelvo.send_signal(SIGINT);
+    EXPECT_EQ(kelvo.wait().status, 0);
 }
 
 /// In a wrapped ring the record at the start of the area, by which files are

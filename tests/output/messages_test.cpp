@@ -86,7 +86,7 @@ TEST(Handover, KeepsTheOrderForTheMainThread) {
     write_handed_over_output();
     warn_insufficient_resources_during_open("main", 8);
     anchor.threadId = {};
-    EXPECT_EQ(flushed_stdout(), "12345\nkelvo: in use\n\t[INSUFFICIENT MEMORY TO PROCESS]\nlast\n"
+    EXPECT_EQ(flushed_stdout(), "12345\nkelvo: in use\nlast\n\t[INSUFFICIENT MEMORY TO PROCESS]\n"
                                 "\t[INSUFFICIENT MEMORY TO PROCESS]\n");
     EXPECT_EQ(GetCapturedStderr(),
               "WARNING: Insufficient memory (size=1099511627776) to process: trace\n"

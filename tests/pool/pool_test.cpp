@@ -168,7 +168,7 @@ void runs_tasks_in_order() {
     EXPECT_THAT(errors.text(),
                 HasSubstr("WARNING: Insufficient memory (size=0) to process: pthread_create\n"));
 
-    totalFreeThrdsInPool += 60; // so that nothing is added from here on
+    totalFreeThrdsInPool += 1000; // so that nothing is added from here on
     gate.open();
     std::vector<void*> expected;
     for (size_t uTask = 0; uTask < tasks.size(); ++uTask) {
@@ -188,7 +188,7 @@ void closing_drops_what_has_not_begun() {
     const stderr_file errors;
     iThreadsAllowed = 3;
     start_pool();
-    totalFreeThrdsInPool += 60; // nothing is added: three tasks run, the others wait
+    totalFreeThrdsInPool += 1000; // nothing is added: three tasks run, the others wait
     for (size_t uTask = 0; uTask < 10; ++uTask)
         ASSERT_EQ(add_task(uTask), 0);
     gate.wait_for_entered(3);
@@ -208,6 +208,24 @@ void closing_drops_what_has_not_begun() {
 
 TEST(Pool, ClosingDropsWhatHasNotBegun) {
     IN_OWN_PROCESS(closing_drops_what_has_not_begun);
+}
+
+/// None of the tasks ends before all have begun: each needs a thread of its own,
+/// however few threads have woken up when the next one comes.
+void every_task_gets_a_thread() {
+    const stderr_file errors;
+    iThreadsAllowed = 1000;
+    start_pool();
+    for (size_t uTask = 0; uTask < tasks.size(); ++uTask)
+        ASSERT_EQ(add_task(uTask), 0);
+    gate.wait_for_entered(tasks.size());
+    gate.open();
+    while (!endThrdPool()) {
+    }
+}
+
+TEST(Pool, EveryTaskGetsAThreadOfItsOwn) {
+    IN_OWN_PROCESS(every_task_gets_a_thread);
 }
 
 void no_thread_at_all() {

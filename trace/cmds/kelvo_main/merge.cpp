@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <array>
 #include <cstdlib>
+#include <sched.h>
 #include <span>
 
 namespace {
@@ -21,7 +22,8 @@ constexpr int64_t MERGE_WAIT_US = 50;        // a running file has nothing queue
 constexpr int64_t EMPTY_QUEUE_WAIT_US = 100; // nothing is queued at all
 constexpr int64_t FOLLOW_WAIT_US = 100'000;  // follow mode, no file is running
 constexpr int64_t IDLE_WAIT_US = 10'000;     // longest stretch of the first two
-constexpr int LOOKS_BEFORE_STRETCHING = 200; // waits of the named length, at first
+constexpr int LOOKS_BEFORE_SLEEPING = 20;    // a reader often needs no more than a moment
+constexpr int LOOKS_BEFORE_STRETCHING = 200; // waits of the named length, after those
 
 /// Records taken in one go. Long enough to make the lock cheap, short enough
 /// for readers that wait for room.
@@ -110,17 +112,23 @@ void finish_records(taken_records& taken) {
         free(pElement);
 }
 
-/// How long the main thread waits when it finds nothing to take: the named
-/// interval at first, longer when nothing has come for a while.
+/// How long the main thread waits when it finds nothing to take: it lets others
+/// run at first, sleeps the named interval then, and longer when nothing has
+/// come for a while.
 class idle_wait {
 public:
     void wait() {
         if (anchor.bFollow && !stdout_is_empty())
             stdout_flush(); // whoever reads a pipe sees the records at once
-        const int64_t iNamed = ctrl.queueDepth == 0 ? EMPTY_QUEUE_WAIT_US : MERGE_WAIT_US;
-        if (m_iLooks < LOOKS_BEFORE_STRETCHING)
+        if (m_iLooks <= LOOKS_BEFORE_STRETCHING)
             ++m_iLooks;
-        else
+        if (m_iLooks <= LOOKS_BEFORE_SLEEPING) {
+            sched_yield();
+            take_pending_signal();
+            return;
+        }
+        const int64_t iNamed = ctrl.queueDepth == 0 ? EMPTY_QUEUE_WAIT_US : MERGE_WAIT_US;
+        if (m_iLooks > LOOKS_BEFORE_STRETCHING)
             m_iStretched = std::min(m_iStretched * 2, IDLE_WAIT_US);
         main_thread_sleep(std::max(iNamed, m_iStretched));
     }
@@ -192,7 +200,6 @@ void file_stops_running(trace_file* pTraceFile) {
         --ctrl.uFilesWithNothingQueued;
     pTraceFile->bRunning = 0;
     --ctrl.uRunningFiles;
-    ++ctrl.uFinishedFiles;
 }
 
 bool find_and_format_next_record() {

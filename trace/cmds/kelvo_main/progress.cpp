@@ -1,9 +1,9 @@
 #include "progress.h"
 
 #include "kelvo.h"
+#include "messages.h"
 
 #include <algorithm>
-#include <cstdio>
 
 namespace {
 
@@ -15,9 +15,8 @@ float prog_percent = -1.0F;  // as last drawn
 uint32_t num_tf_openned = 0; // files counted so far
 
 void draw(int iPercent, int iMarks) {
-    fprintf(stderr, "\r%3d%%|%-*.*s|%8u/%u files processed... ", iPercent, BAR_WIDTH, iMarks, BAR,
-            num_tf_openned, total_tf_count);
-    fflush(stderr);
+    output_err_text("\r%3d%%|%-*.*s|%8u/%u files processed... ", iPercent, BAR_WIDTH, iMarks, BAR,
+                    num_tf_openned, total_tf_count);
 }
 
 } // namespace

@@ -3,6 +3,7 @@
 #include "first_record.h"
 #include "insufficient.h"
 #include "merge.h"
+#include "messages.h"
 #include "mutex.h"
 #include "open.h"
 #include "output_queue.h"
@@ -14,8 +15,8 @@
 
 #include <algorithm>
 #include <array>
-#include <cstdio>
 #include <cstdlib>
+#include <sched.h>
 #include <unistd.h>
 
 namespace {
@@ -25,11 +26,12 @@ TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;
 constexpr int64_t FULL_QUEUE_WAIT_NS = 500'000;
 constexpr int64_t HELD_BACK_WAIT_NS = 10'000'000; // woken earlier when the room is there
 constexpr useconds_t FOLLOW_WAIT_US = 100'000;
+constexpr int LOOKS_BEFORE_SLEEPING = 20;
 constexpr useconds_t NUMBER_WAIT_US = 100;
 constexpr int NUMBER_WAITS = 50; // a writer that was killed stores no number any more
 
 /// More files than this at once do not make a file's share of the cap smaller.
-constexpr uint32_t MAX_SHARES = 64;
+constexpr int64_t MAX_SHARES = 64;
 
 /// Copies of records that are not yet pushed.
 struct record_batch {
@@ -40,15 +42,15 @@ struct record_batch {
 /// Diagnostic line of the low-memory mode.
 void say(const char* pWhat, const trace_file* pTraceFile) {
     if (memory_is_restricted)
-        fprintf(stderr, "%s: %s\n", pWhat, pTraceFile->pName);
+        output_err_text("%s: %s\n", pWhat, pTraceFile->pName);
 }
 
 // ------------------------------------------------------------- room to push
 
 /// This file's part of the cap.
 uint32_t share_of_queue() {
-    const uint32_t uUnfinished = static_cast<uint32_t>(anchor.iNumberFiles) - ctrl.uFinishedFiles;
-    return MAX_QUEUED / std::clamp(uUnfinished, 1U, MAX_SHARES);
+    const int64_t iUnfinished = int64_t{anchor.iNumberFiles} - ctrl.uFinishedFiles;
+    return MAX_QUEUED / static_cast<uint32_t>(std::clamp<int64_t>(iUnfinished, 1, MAX_SHARES));
 }
 
 bool queue_is_full_for(const trace_file* pTraceFile) {
@@ -69,13 +71,24 @@ void wait_on_room(trace_file* pTraceFile, uint32_t uRoomAt, int64_t iNanoseconds
     pTraceFile->bWaitsForRoom = 0;
 }
 
+/// Waits until no record that changes the file's time base is queued: a moment
+/// without sleeping, since the main thread formats it as soon as it may.
+void wait_for_time_base(trace_file* pTraceFile) {
+    for (int i = 0; i < LOOKS_BEFORE_SLEEPING && pTraceFile->bTimeBaseInQueue; ++i) {
+        pthread_mutex_unlock(&ctrl.priorityQmutex);
+        sched_yield();
+        pthread_mutex_lock(&ctrl.priorityQmutex);
+    }
+    while (pTraceFile->bTimeBaseInQueue)
+        wait_on_room(pTraceFile, 0, HELD_BACK_WAIT_NS);
+}
+
 /// Called with priorityQmutex held, which it gives up while it waits.
 void wait_for_room(trace_file* pTraceFile) {
     if (pTraceFile->numRecPushed >= share_of_queue())
         while (pTraceFile->numRecPushed > share_of_queue() / 2)
             wait_on_room(pTraceFile, share_of_queue() / 2, HELD_BACK_WAIT_NS);
-    while (pTraceFile->bTimeBaseInQueue)
-        wait_on_room(pTraceFile, 0, HELD_BACK_WAIT_NS);
+    wait_for_time_base(pTraceFile);
     while (queue_is_full_for(pTraceFile))
         wait_on_room(pTraceFile, ALWAYS_QUEUED, FULL_QUEUE_WAIT_NS);
 }
@@ -193,6 +206,7 @@ void end_reading(trace_file* pTraceFile) {
     say("Closed", pTraceFile);
     const mutex_guard guard(ctrl.priorityQmutex);
     file_stops_running(pTraceFile);
+    ++ctrl.uFinishedFiles;
     pTraceFile->bDone = 1;
 }
 
@@ -245,6 +259,7 @@ void TrcFileProcessingCtrl(const trace_queue_element* pElement, uint32_t next) {
             return;
         candidate.isOpenned = 0;
         candidate.pTrcFile->bErrorProcessing = 1;
+        ++ctrl.uFinishedFiles;
     }
 }
 

@@ -5,6 +5,7 @@
 #include "insufficient.h"
 #include "kelvo.h"
 #include "merge.h"
+#include "messages.h"
 #include "mutex.h"
 #include "open.h"
 #include "output_queue.h"
@@ -92,14 +93,14 @@ int open_files(const command_line& command) {
 // ------------------------------------------------------------ normal mode
 
 void print_sorted_files() {
-    fputs("================================SORTED TRACE FILE LIST"
-          "===================================\n",
-          stderr);
+    output_err_text("================================SORTED TRACE FILE LIST"
+                    "===================================\n");
     for (int32_t i = 0; i < anchor.iNumberFiles; ++i) {
         const TrcPreProcHdrElem& elem = ctrl.pTrcPreProcHdrList[i];
-        fprintf(stderr, "FileIndex: %03u\tTimeStamp: %020llu\tFileName: %s\n",
-                static_cast<unsigned int>(elem.pTrcFile->index),
-                static_cast<unsigned long long>(elem.header.timeStamp), elem.pTrcFile->pName);
+        output_err_text("FileIndex: %03u\tTimeStamp: %020llu\tFileName: %s\n",
+                        static_cast<unsigned int>(elem.pTrcFile->index),
+                        static_cast<unsigned long long>(elem.header.timeStamp),
+                        elem.pTrcFile->pName);
     }
     main_thread_sleep(LOW_MEMORY_PAUSE_US);
 }
@@ -127,10 +128,9 @@ void print_time_zone() {
 
 void print_totals() {
     if (const uint32_t uWarnings = insufficient_resources_warnings(); uWarnings != 0)
-        fprintf(stderr,
-                "Total insufficient memory warning messages: %u\n"
-                "Total insufficient memory warning messages during file open: %u\n",
-                uWarnings, insufficient_resources_warnings_during_open());
+        output_err_text("Total insufficient memory warning messages: %u\n"
+                        "Total insufficient memory warning messages during file open: %u\n",
+                        uWarnings, insufficient_resources_warnings_during_open());
 }
 
 /// Everything between the start of the pool and the totals. Returns bError.
@@ -154,7 +154,7 @@ int process_files(const command_line& command) {
     merge_records();
     print_totals();
     if (!anchor.bFollow && bShowProgress)
-        fputc('\n', stderr);
+        output_err_text("\n");
     return bError;
 }
 

@@ -19,7 +19,6 @@
 
 #include <algorithm>
 #include <csignal>
-#include <cstdio>
 #include <ctime>
 #include <memory>
 #include <new>
@@ -31,9 +30,12 @@ std::atomic<uint32_t> totalFreeThrdsInPool{0};
 
 namespace {
 
+/// Tasks queued and not yet taken: each of them has a claim on a free thread.
+std::atomic<uint32_t> totalWaitingTasks{0};
+
 constexpr int THREADS_AT_START = 16;
 constexpr int THREADS_PER_GROWTH = 4;
-constexpr uint32_t FEWEST_FREE_THREADS = 3;
+constexpr uint32_t FEWEST_FREE_THREADS = 3; // beyond those that waiting tasks will take
 
 // Microseconds.
 constexpr int64_t IDLE_INTERVAL = 1500;
@@ -82,6 +84,11 @@ void append_task(thrd_task* pTask) {
     else
         task_queue->pFirstTask = pTask;
     task_queue->pLastTask = pTask;
+    ++totalWaitingTasks;
+}
+
+bool enough_threads_are_free() {
+    return totalFreeThrdsInPool >= FEWEST_FREE_THREADS + totalWaitingTasks;
 }
 
 /// The task at the head, now the caller's; the queue is not empty.
@@ -90,6 +97,7 @@ thrd_task* take_first_task() {
     task_queue->pFirstTask = pTask->pNextTask;
     if (task_queue->pFirstTask == nullptr)
         task_queue->pLastTask = nullptr;
+    --totalWaitingTasks;
     return pTask;
 }
 
@@ -232,19 +240,19 @@ int create_threads(int iCount) {
 /// could be added.
 int addThreadsToPool(int iCount) {
     if (memory_is_restricted == 1)
-        fprintf(stderr, "[POOL]Total: %06u    Free: %06u |  Adding Threads\n",
-                totalThrdsInPool.load(), totalFreeThrdsInPool.load());
+        output_err_text("[POOL]Total: %06u    Free: %06u |  Adding Threads\n",
+                        totalThrdsInPool.load(), totalFreeThrdsInPool.load());
     int iResult = -1;
     {
         const mutex_guard lock(thrd_pool_mutex);
-        if (totalFreeThrdsInPool >= FEWEST_FREE_THREADS)
+        if (enough_threads_are_free())
             iResult = 0;
         else if (!is_closed())
             iResult = create_threads(iCount);
     }
     if (memory_is_restricted == 1)
-        fprintf(stderr, "[POOL] Total: %06u    Free: %06u |  Aifter adding Threads\n",
-                totalThrdsInPool.load(), totalFreeThrdsInPool.load());
+        output_err_text("[POOL] Total: %06u    Free: %06u |  Aifter adding Threads\n",
+                        totalThrdsInPool.load(), totalFreeThrdsInPool.load());
     return iResult;
 }
 
@@ -255,7 +263,7 @@ int startNewThreadPool() {
 }
 
 int poolAddNewTask(std::atomic<pthread_t>* pServiceThrdId, void* pTask) {
-    if (totalFreeThrdsInPool < FEWEST_FREE_THREADS && addThreadsToPool(THREADS_PER_GROWTH) == -1)
+    if (!enough_threads_are_free() && addThreadsToPool(THREADS_PER_GROWTH) == -1)
         return -1;
     std::unique_ptr<thrd_task> task(new (std::nothrow) thrd_task{nullptr, pTask, pServiceThrdId});
     if (task == nullptr) {

@@ -1,6 +1,7 @@
 #include "handover.h"
 
 #include "kelvo.h"
+#include "mutex.h"
 #include "sink.h"
 #include "stdout_stream.h"
 
@@ -15,7 +16,6 @@ namespace {
 struct waiting_text {
     waiting_text* pNext;
     size_t uSize;
-    bool bStraight;
 
     char* text() {
         return reinterpret_cast<char*>(this + 1);
@@ -25,16 +25,23 @@ struct waiting_text {
 pthread_mutex_t waiting_mutex = PTHREAD_MUTEX_INITIALIZER; // guards the list; taken last
 waiting_text* pFirstWaiting = nullptr;
 waiting_text** ppEndWaiting = &pFirstWaiting;
-std::atomic<bool> bAnyWaiting = false; // a look at the list without the mutex
+uint32_t uWaitingMarkers = 0;
+std::atomic<bool> bAnyWaiting = false; // a look at both without the mutex
 
-waiting_text* take_all_waiting() {
-    pthread_mutex_lock(&waiting_mutex);
-    waiting_text* pFirst = pFirstWaiting;
+// What waited, taken over by the main thread.
+struct taken_over {
+    waiting_text* pFirst;
+    uint32_t uMarkers;
+};
+
+taken_over take_all_waiting() {
+    const mutex_guard guard(waiting_mutex);
+    const taken_over taken{pFirstWaiting, uWaitingMarkers};
     pFirstWaiting = nullptr;
     ppEndWaiting = &pFirstWaiting;
+    uWaitingMarkers = 0;
     bAnyWaiting.store(false, std::memory_order_relaxed);
-    pthread_mutex_unlock(&waiting_mutex);
-    return pFirst;
+    return taken;
 }
 
 } // namespace
@@ -43,35 +50,36 @@ bool owns_standard_output() {
     return anchor.threadId == pthread_t{} || pthread_equal(anchor.threadId, pthread_self()) != 0;
 }
 
-void hand_over_output(std::string_view text, bool bStraight) {
+void hand_over_output(std::string_view text) {
     void* pBlock = std::malloc(sizeof(waiting_text) + text.size());
     if (pBlock == nullptr)
         return;
-    auto* pWaiting = new (pBlock) waiting_text{nullptr, text.size(), bStraight};
+    auto* pWaiting = new (pBlock) waiting_text{nullptr, text.size()};
     text.copy(pWaiting->text(), text.size());
 
-    pthread_mutex_lock(&waiting_mutex);
+    const mutex_guard guard(waiting_mutex);
     *ppEndWaiting = pWaiting;
     ppEndWaiting = &pWaiting->pNext;
     bAnyWaiting.store(true, std::memory_order_relaxed);
-    pthread_mutex_unlock(&waiting_mutex);
+}
+
+void hand_over_marker() {
+    const mutex_guard guard(waiting_mutex);
+    uWaitingMarkers++;
+    bAnyWaiting.store(true, std::memory_order_relaxed);
 }
 
 void write_handed_over_output() {
     if (!bAnyWaiting.load(std::memory_order_relaxed))
         return;
     output_abandon_rec(); // what is still open between two records was given up
-    waiting_text* pWaiting = take_all_waiting();
-    while (pWaiting != nullptr) {
-        const std::string_view text{pWaiting->text(), pWaiting->uSize};
-        if (pWaiting->bStraight) {
-            stdout_write(text);
-            stdout_flush();
-        } else {
-            output_text(text);
-        }
-        waiting_text* pNext = pWaiting->pNext;
+    taken_over taken = take_all_waiting();
+    while (waiting_text* pWaiting = taken.pFirst) {
+        output_text({pWaiting->text(), pWaiting->uSize});
+        taken.pFirst = pWaiting->pNext;
         std::free(pWaiting);
-        pWaiting = pNext;
     }
+    for (; taken.uMarkers > 0; taken.uMarkers--)
+        stdout_write(insufficient_resources_warning_message_in_output_header);
+    stdout_flush();
 }

@@ -45,5 +45,5 @@ void output_message(const char* pMsg, ...) {
     if (owns_standard_output())
         output_text(text);
     else
-        hand_over_output(text, false);
+        hand_over_output(text);
 }
