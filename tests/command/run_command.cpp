@@ -11,6 +11,7 @@
 #include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <utility>
 
 #include <gtest/gtest.h>
 
@@ -186,6 +187,13 @@ std::string live_command::read_line() {
     std::string sLine = m_out.sText.substr(0, uEnd);
     m_out.sText.erase(0, uEnd == std::string::npos ? uEnd : uEnd + 1);
     return sLine;
+}
+
+std::string live_command::read_text() {
+    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    while (m_out.sText.empty() && m_out.fd >= 0)
+        receive(iDeadline);
+    return std::exchange(m_out.sText, {});
 }
 
 std::string live_command::read_line_with(const std::string& sText) {

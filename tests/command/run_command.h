@@ -41,6 +41,10 @@ public:
     /// the output ends without one. Fails the test when nothing comes in time.
     std::string read_line();
 
+    /// What standard output brings next, as much as has come; "" at its end.
+    /// For long outputs. Fails the test when nothing comes in time.
+    std::string read_text();
+
     /// Reads lines up to the first that contains `sText` and returns that line.
     /// Fails the test, and returns "", when the output ends before.
     std::string read_line_with(const std::string& sText);

@@ -1,0 +1,238 @@
+// How runs end: by the signals of a terminal and of a pipe, by others, by
+// faults, and what a killed reader or writer leaves behind.
+#include "live_support.h"
+#include "sample_trace.h"
+#include "temp_dir.h"
+
+#include <csignal>
+#include <cstdlib>
+#include <cstring>
+#include <random>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+class End : public testing::Test {
+protected:
+    End() {
+        m_setup.sDirectory = m_dir.path(); // a core file goes with the directory
+        // A sanitizer would report these signals and end the process its own way.
+        for (const char* pName : {"ASAN_OPTIONS", "TSAN_OPTIONS", "UBSAN_OPTIONS"}) {
+            const char* const pOptions = getenv(pName);
+            m_setup.environment.push_back(
+                pName + std::string("=") + (pOptions != nullptr ? pOptions : "") +
+                ":handle_segv=0:handle_sigbus=0:handle_sigfpe=0:handle_sigill=0");
+        }
+    }
+
+    /// A writer that fills both files for as long as the test wants it.
+    live_command start_writer(const std::vector<std::string>& options = {}) {
+        std::vector<std::string> arguments{"-s", "262144"};
+        arguments.insert(arguments.end(), options.begin(), options.end());
+        arguments.insert(arguments.end(), {m_sFirst, m_sSecond});
+        return live_command(arguments, live_writer_setup());
+    }
+
+    /// A run that follows both files from their first record on.
+    live_command start_following() {
+        return live_command({"-f", "-s", "+0r", "-o", "s", m_sFirst, m_sSecond}, m_setup);
+    }
+
+    /// A closed file whose text is much longer than a pipe and the run's queue.
+    std::string make_big_file(uint32_t uRecords = 200'000) {
+        trace_writer_options options;
+        options.uFileSize = 4096 + uRecords * 40;
+        trace_writer writer;
+        EXPECT_EQ(writer.create(m_sBig.c_str(), options), TRACE_WRITER_OK);
+        for (uint32_t i = 0; i < uRecords; ++i)
+            EXPECT_EQ(writer.append_uint32({"_TST", 1, i}, 1, i), TRACE_WRITER_OK);
+        return m_sBig;
+    }
+
+    useconds_t up_to(unsigned int uMicroseconds) {
+        return static_cast<useconds_t>(m_random() % uMicroseconds);
+    }
+
+    temp_dir m_dir;
+    const std::string m_sFirst = m_dir.file("first.trc");
+    const std::string m_sSecond = m_dir.file("second.trc");
+    const std::string m_sBig = m_dir.file("big.trc");
+    command_setup m_setup;
+    std::mt19937 m_random{static_cast<unsigned int>(getpid())};
+};
+
+// ------------------------------------------------------- terminating signals
+
+constexpr int TERMINATING[] = {SIGINT, SIGQUIT, SIGTSTP, SIGTTIN, SIGTTOU, SIGPIPE};
+
+TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
+    const uint64_t uTimes = setting("KELVO_TEST_LIVE_SIGNALS", 8);
+    live_command writer = start_writer();
+    writer.read_line_with("ready");
+    for (uint64_t i = 0; i < uTimes; ++i)
+        for (const int signo : TERMINATING) {
+            SCOPED_TRACE(strsignal(signo));
+            live_command kelvo = start_following();
+            record_stream stream(kelvo);
+            stream.next();
+            const useconds_t moment = up_to(40'000);
+            if (i % 2 == 0) { // while its reader keeps up
+                for (const uint64_t uEnough = stream.count() + moment / 4;
+                     stream.count() < uEnough && stream.next();)
+                    ;
+                kelvo.send_signal(signo);
+            } else { // while nobody reads
+                usleep(moment);
+                kelvo.send_signal(signo);
+                usleep(up_to(5000));
+            }
+            stream.drain();
+            const command_result result = kelvo.wait();
+            EXPECT_EQ(result.status, 0) << "signal " << result.signo;
+            EXPECT_EQ(result.sErr, "");
+            ASSERT_FALSE(HasFailure());
+        }
+    writer.send_signal(SIGTERM);
+    EXPECT_EQ(writer.wait().status, 0);
+}
+
+TEST_F(End, OtherSignalsKeepTheirEffect) {
+    trace_writer writer;
+    ASSERT_EQ(writer.create(m_sFirst.c_str()), TRACE_WRITER_OK);
+    for (const int signo : {SIGTERM, SIGHUP}) {
+        live_command kelvo({"-f", m_sFirst}, m_setup);
+        kelvo.read_line_with("Build Level");
+        kelvo.send_signal(signo);
+        EXPECT_EQ(kelvo.wait().signo, signo);
+    }
+}
+
+TEST_F(End, AReaderOfThePipeThatHasEnoughIsNoError) {
+    command_setup shell;
+    shell.sProgram = "/bin/sh";
+    const command_result result =
+        run_command({"-c", "{ \"$0\" \"$1\"; echo status $? >&2; } | head -n 1", KELVO_PROGRAM,
+                     make_big_file()},
+                    shell);
+    EXPECT_EQ(result.sOut, "Filename: " + m_sBig + "\n");
+    EXPECT_EQ(result.sErr, "status 0\n");
+}
+
+// -------------------------------------------------------------------- faults
+
+TEST_F(End, AFaultSignalFromOutsideEndsTheProcessByThatSignal) {
+    trace_writer writer;
+    ASSERT_EQ(writer.create(m_sFirst.c_str()), TRACE_WRITER_OK);
+    for (const int signo : {SIGSEGV, SIGBUS}) {
+        live_command following({"-f", m_sFirst}, m_setup);
+        following.read_line_with("Build Level");
+        following.send_signal(signo);
+        EXPECT_EQ(following.wait().signo, signo);
+    }
+}
+
+TEST_F(End, AFileTruncatedWhileItIsFollowedEndsTheRun) {
+    for (const std::string& sTruncated : {m_sFirst, m_sSecond}) {
+        for (const std::string& sPath : {m_sFirst, m_sSecond})
+            ASSERT_EQ(write_sample_trace(sPath, {sample_string(1, "only")}), TRACE_WRITER_OK);
+        live_command kelvo({"-f", m_sFirst, m_sSecond}, m_setup);
+        kelvo.read_line_with("only");
+        kelvo.read_line_with("only");
+        ASSERT_EQ(truncate(sTruncated.c_str(), 0), 0);
+        EXPECT_EQ(kelvo.wait().signo, SIGBUS);
+    }
+}
+
+/// Outside follow mode the reader meets it while the main thread writes.
+TEST_F(End, AFileTruncatedWhileItIsReadEndsTheRun) {
+    make_big_file();
+    live_command kelvo({"-r", m_sBig}, m_setup);
+    kelvo.read_line_with("val=0x00000000");
+    usleep(up_to(100'000));
+    ASSERT_EQ(truncate(m_sBig.c_str(), 0), 0);
+    const command_result result = kelvo.wait();
+    EXPECT_EQ(result.signo, SIGBUS) << result.sErr;
+}
+
+// ------------------------------------------------------------ killed processes
+
+/// What a run that does not follow finds in the files: each one's numbers
+/// without a gap.
+void read_unbroken(record_stream& stream, live_command& kelvo) {
+    stream.drain();
+    const command_result result = kelvo.wait();
+    EXPECT_EQ(result.status, 0);
+    EXPECT_EQ(result.sErr, "");
+    EXPECT_TRUE(stream.missing().empty()) << testing::PrintToString(stream.missing());
+}
+
+TEST_F(End, AKilledWriterLeavesAFileThatCanBeRead) {
+    const uint64_t uTimes = setting("KELVO_TEST_LIVE_KILLS", 8);
+    for (uint64_t i = 0; i < uTimes && !HasFailure(); ++i) {
+        live_command writer = start_writer({"-r"});
+        writer.read_line_with("ready");
+        const bool bFollowed = i % 2 != 0;
+        std::optional<live_command> follower;
+        uint64_t uLast = 0;
+        if (bFollowed) {
+            follower.emplace(
+                std::vector<std::string>{"-f", "-s", "+0r", "-o", "s", m_sFirst, m_sSecond},
+                m_setup);
+            record_stream stream(*follower);
+            for (const uint64_t uEnough = 1 + up_to(5000);
+                 stream.count() < uEnough && stream.next();)
+                ;
+            usleep(up_to(2000));
+            writer.send_signal(SIGKILL);
+            writer.wait();
+            usleep(150'000); // what is there is taken
+            follower->send_signal(SIGINT);
+            stream.drain();
+            EXPECT_EQ(follower->wait().status, 0);
+            EXPECT_TRUE(stream.missing().empty());
+            uLast = stream.last(0);
+        } else {
+            usleep(up_to(30'000));
+            writer.send_signal(SIGKILL);
+            writer.wait();
+        }
+        EXPECT_FALSE(is_locked(m_sFirst));
+        live_command kelvo({"-o", "s", m_sFirst, m_sSecond}, m_setup);
+        record_stream stream(kelvo);
+        read_unbroken(stream, kelvo);
+        EXPECT_GE(stream.last(0), uLast);
+    }
+}
+
+TEST_F(End, AKilledReaderIsForgotten) {
+    const uint64_t uTimes = setting("KELVO_TEST_LIVE_KILLS", 8);
+    live_command writer = start_writer({"-r"});
+    writer.read_line_with("ready");
+    uint64_t uLast = 0;
+    for (uint64_t i = 0; i < uTimes && !HasFailure(); ++i) {
+        {
+            live_command kelvo = start_following();
+            usleep(up_to(120'000)); // also while it looks for its first record
+            kelvo.send_signal(SIGKILL);
+            kelvo.wait();
+        }
+        EXPECT_FALSE(is_locked(m_sFirst));
+        EXPECT_FALSE(is_locked(m_sSecond));
+        // Only a writer that goes on brings numbers beyond those that were there.
+        live_command kelvo = start_following();
+        record_stream stream(kelvo);
+        while (stream.last(0) <= uLast + 20'000 && stream.next()) {
+        }
+        uLast = stream.last(0);
+        kelvo.send_signal(SIGINT);
+        stream.drain();
+        EXPECT_EQ(kelvo.wait().status, 0);
+        EXPECT_TRUE(stream.missing().empty()) << testing::PrintToString(stream.missing());
+    }
+    writer.send_signal(SIGTERM);
+    EXPECT_EQ(writer.wait().status, 0);
+}
+
+} // namespace
