@@ -65,10 +65,25 @@ struct conv_spec {
 /// Bits of format_entry::properties.
 enum : int32_t { FORMAT_NUMBERED_PARMS = 1 };
 
-/// Literal text of a format string as it is written: "%%" as one percent sign.
+/// Literal text of a format string as it is written, "%%" as one percent sign,
+/// and how the conversion behind it is written.
 struct format_piece {
     const char* pText;
-    size_t uLength;
+    uint32_t uLength;
+    uint8_t uDirect; ///< a direct_writer; found out when the conversion is first written
+    uint8_t uWidth;  ///< of a number that is written directly
+    bool bZeros;     ///< it is filled up with zeros rather than blanks
+};
+
+/// Writers of the usual conversions, which go by nothing but the value.
+enum direct_writer : uint8_t {
+    DIRECT_UNKNOWN = 0, ///< not yet looked at
+    DIRECT_NONE,        ///< goes by its text each time
+    DIRECT_SIGNED,
+    DIRECT_UNSIGNED,
+    DIRECT_HEX,
+    DIRECT_CHAR,
+    DIRECT_STRING,
 };
 
 /// A compiled format string. One allocation holds the entry, its conversions,

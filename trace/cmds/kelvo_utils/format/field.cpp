@@ -131,11 +131,6 @@ char* put_digits(char* pOut, char letter, uint64_t uValue) {
     return pEnd;
 }
 
-/// Whether there are neither flags nor width nor precision.
-bool is_bare(const conversion& conv) {
-    return conv.uFlags == 0 && conv.iWidth == 0 && conv.iPrecision < 0;
-}
-
 std::string_view sign_of(const conversion& conv, bool bNegative) {
     if (bNegative)
         return "-";
@@ -180,20 +175,8 @@ void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int i
         write_by_printf(out, conv, "", reinterpret_cast<void*>(static_cast<uintptr_t>(uValue)));
     else if (conv.uFlags & CONVERSION_GROUP)
         write_by_printf(out, conv, "ll", static_cast<long long>(iValue));
-    else if (is_bare(conv))
-        write_bare_integer(out, conv.letter, iValue);
     else
         write_number(out, conv, iValue);
-}
-
-void write_bare_integer(text_run& out, char letter, int64_t iValue) {
-    auto uMagnitude = static_cast<uint64_t>(iValue);
-    char* pOut = out.begin_room(INTEGER_ROOM);
-    if (iValue < 0 && is_signed(letter)) {
-        *pOut++ = '-';
-        uMagnitude = -uMagnitude;
-    }
-    out.end_room(put_digits(pOut, letter, uMagnitude));
 }
 
 void write_real(text_run& out, const conversion& conv, double value) {

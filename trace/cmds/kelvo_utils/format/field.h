@@ -19,10 +19,6 @@ inline constexpr size_t MAX_FIELD_TEXT = 4095;
 /// 32 or 64); the letter says whether they are signed.
 void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits);
 
-/// An integer by "diouxX" without flags, width and precision. For the unsigned
-/// letters `iValue` is the bits of a number without sign.
-void write_bare_integer(text_run& out, char letter, int64_t iValue);
-
 /// A floating-point number by "eEfgG".
 void write_real(text_run& out, const conversion& conv, double value);
 

@@ -47,6 +47,11 @@ char* put_thread(char* pOut, const prefix_source& source) {
 
 // Four columns, right-aligned when a NUL ends the id early.
 char* put_component(char* pOut, const prefix_source& source) {
+    const auto ends = [&](int i) { return source.pCompId[i] == '\0'; };
+    if (!ends(0) && !ends(1) && !ends(2) && !ends(3)) [[likely]] {
+        *pOut++ = ' ';
+        return put_text(pOut, {source.pCompId, 4});
+    }
     const std::string_view text(source.pCompId, strnlen(source.pCompId, 4));
     pOut = std::fill_n(pOut, 1 + 4 - text.size(), ' ');
     return put_text(pOut, text);

@@ -7,6 +7,7 @@
 #include "parms.h"
 
 #include "conversion.h"
+#include "direct.h"
 #include "field.h"
 #include "text_run.h"
 
@@ -190,29 +191,7 @@ void write_value(text_run& out, const conversion& conv, parm_type_t type, const 
     }
 }
 
-/// The shortcut for the conversions that most records consist of: a letter
-/// alone. Such a conversion has its parameter to itself, so the type is that of
-/// the letter. Returns false when there is no shortcut.
-bool write_bare(text_run& out, char letter, parm_type_t type, const parm_ref& parm) {
-    switch (type) {
-    case PARM_INT:
-        write_bare_integer(out, letter, load<int32_t>(parm.bytes, 0));
-        return true;
-    case PARM_INT | PARM_UNSIGNED:
-        write_bare_integer(out, letter, load<uint32_t>(parm.bytes, 0));
-        return true;
-    case PARM_CHAR | PARM_UNSIGNED:
-        out.add(load<char>(parm.bytes, 0));
-        return true;
-    case PARM_STRING:
-        out.add(parm_string(parm));
-        return true;
-    default:
-        return false;
-    }
-}
-
-void write_conversion(format_run& run, const conv_spec& place) {
+void write_conversion(format_run& run, const conv_spec& place, format_piece& piece) {
     const format_entry& entry = *run.pEntry;
     const parm_type_t type = entry.pParmTypes[place.parmNum];
     const std::string_view text(entry.pString + place.offset, place.lenConv);
@@ -225,8 +204,20 @@ void write_conversion(format_run& run, const conv_spec& place) {
         return;
     }
     const parm_ref& parm = run.parm(place.parmNum);
-    if (text.size() == 2 && write_bare(run.out, text[1], type, parm))
+    const bool bNumbered = entry.properties & FORMAT_NUMBERED_PARMS;
+    if (piece.uDirect == DIRECT_UNKNOWN) {
+        if (place.widthParmNum == NO_PARM && place.precParmNum == NO_PARM)
+            choose_direct_writer(&piece, parse_conversion(text, bNumbered, type, 0, 0), type);
+        else
+            piece.uDirect = DIRECT_NONE;
+    }
+    if (piece.uDirect != DIRECT_NONE) {
+        if (piece.uDirect == DIRECT_STRING)
+            run.out.add(parm_string(parm));
+        else
+            write_direct(run.out, piece, type, parm.bytes, run.bAddr64);
         return;
+    }
     // These go by no conversion of printf's, whatever stands in the text.
     switch (base_type(type)) {
     case PARM_RESOURCE_HANDLE:
@@ -241,7 +232,6 @@ void write_conversion(format_run& run, const conv_spec& place) {
         break;
     }
 
-    const bool bNumbered = entry.properties & FORMAT_NUMBERED_PARMS;
     const conversion conv =
         parse_conversion(text, bNumbered, type, run.star_value(place.widthParmNum),
                          run.star_value(place.precParmNum));
@@ -315,12 +305,12 @@ void bld_parm_list_unpacked(const format_entry* pFormatEntry, trace_bytes* pBloc
 
 void format_parms(const format_entry* pFormatEntry, const parm_list* pList, int bAddr64) {
     format_run run{.pEntry = pFormatEntry, .pList = pList, .bAddr64 = bAddr64, .out = {}};
-    const format_piece* pPiece = pFormatEntry->pPieces;
+    format_piece* pPiece = pFormatEntry->pPieces;
     for (const conv_spec& place :
          std::span(pFormatEntry->pConvSpecs, static_cast<size_t>(pFormatEntry->numConvs))) {
         run.out.add(std::string_view(pPiece->pText, pPiece->uLength));
+        write_conversion(run, place, *pPiece);
         ++pPiece;
-        write_conversion(run, place);
     }
     run.out.add(std::string_view(pPiece->pText, pPiece->uLength));
     run.out.add('\n');

@@ -40,6 +40,37 @@ inline constexpr auto DIGIT_PAIRS = [] {
     return pairs;
 }();
 
+/// Decimal digits of `value`; 1 for 0.
+inline int count_decimal_digits(uint64_t value) {
+    constexpr auto POWERS = [] {
+        std::array<uint64_t, 20> powers{};
+        uint64_t power = 1;
+        for (uint64_t& entry : powers) {
+            entry = power;
+            power *= 10;
+        }
+        powers[0] = 0; // 0 has a digit too
+        return powers;
+    }();
+    const int guess = static_cast<int>(std::bit_width(value | 1)) * 1233 >> 12;
+    return guess + (value >= POWERS[static_cast<size_t>(guess)]);
+}
+
+/// `value` as `digits` decimal digits, as many as count_decimal_digits says.
+inline char* put_decimal(char* pOut, uint64_t value, int digits) {
+    char* pDigit = pOut + digits;
+    while (value >= 100) {
+        pDigit -= 2;
+        std::memcpy(pDigit, &DIGIT_PAIRS[2 * (value % 100)], 2);
+        value /= 100;
+    }
+    if (value >= 10)
+        std::memcpy(pOut, &DIGIT_PAIRS[2 * value], 2);
+    else
+        *pOut = static_cast<char>('0' + value);
+    return pOut + digits;
+}
+
 /// `value`, below 1000000000, as exactly nine decimal digits.
 inline char* put_nanoseconds(char* pOut, uint32_t value) {
     for (int i = 7; i > 0; i -= 2) {
