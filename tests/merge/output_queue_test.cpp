@@ -85,8 +85,8 @@ TEST_F(OutputQueue, TiesLeaveInPushOrderAcrossFilesAndThePushNumbersWrap) {
         pushed.push_back(push(pElement));
     }
     for (trace_queue_element* pElement : pushed)
-        EXPECT_EQ(m_queue.pop(), pElement);
-    EXPECT_EQ(m_queue.pop(), nullptr);
+        EXPECT_EQ(m_queue.pop().pElement, pElement);
+    EXPECT_EQ(m_queue.pop().pElement, nullptr);
 }
 
 TEST_F(OutputQueue, AStartRecordIsPlacedByTheTimeBaseInItsBody) {
@@ -94,8 +94,8 @@ TEST_F(OutputQueue, AStartRecordIsPlacedByTheTimeBaseInItsBody) {
     trace_file& late = file({5000, 0});
     trace_queue_element* const pRecord = push(element(late, 10));                 // 5010
     trace_queue_element* const pStart = push(start_record(early, 10, {9000, 0})); // 9010
-    EXPECT_EQ(m_queue.pop(), pRecord);
-    EXPECT_EQ(m_queue.pop(), pStart);
+    EXPECT_EQ(m_queue.pop().pElement, pRecord);
+    EXPECT_EQ(m_queue.pop().pElement, pStart);
 }
 
 TEST_F(OutputQueue, TimesBeforeTheEpochAndBeyond64BitsKeepTheirOrder) {
@@ -105,9 +105,9 @@ TEST_F(OutputQueue, TimesBeforeTheEpochAndBeyond64BitsKeepTheirOrder) {
     trace_queue_element* const pBeyond = push(element(beyond, UINT64_MAX));
     trace_queue_element* const pPlain = push(element(plain, UINT64_MAX));
     trace_queue_element* const pBefore = push(element(before, 0));
-    EXPECT_EQ(m_queue.pop(), pBefore);
-    EXPECT_EQ(m_queue.pop(), pPlain);
-    EXPECT_EQ(m_queue.pop(), pBeyond);
+    EXPECT_EQ(m_queue.pop().pElement, pBefore);
+    EXPECT_EQ(m_queue.pop().pElement, pPlain);
+    EXPECT_EQ(m_queue.pop().pElement, pBeyond);
 }
 
 /// Random pushes, takes and changes of time bases against a search of all that
@@ -127,7 +127,7 @@ TEST_F(OutputQueue, AgreesWithASearchWhateverThePushesAre) {
             else
                 push(element(from, uTime + below(uDisorder + 1)));
             while (!m_queued.empty() && below(2) == 0)
-                ASSERT_EQ(m_queue.pop(), expected()) << "seed " << uSeed;
+                ASSERT_EQ(m_queue.pop().pElement, expected()) << "seed " << uSeed;
             if (below(10) == 0) {
                 // What is queued behind a start record does not move with it;
                 // the readers never let it come to that.
@@ -136,13 +136,13 @@ TEST_F(OutputQueue, AgreesWithASearchWhateverThePushesAre) {
                         return pElement->header.function == TRC_FUNC_START;
                     });
                 while (bStartQueued && !m_queued.empty())
-                    ASSERT_EQ(m_queue.pop(), expected()) << "seed " << uSeed;
+                    ASSERT_EQ(m_queue.pop().pElement, expected()) << "seed " << uSeed;
                 files[below(files.size())]->timeInfo = {below(100), below(100)};
                 m_queue.time_base_changed();
             }
         }
         while (!m_queued.empty())
-            ASSERT_EQ(m_queue.pop(), expected()) << "seed " << uSeed;
+            ASSERT_EQ(m_queue.pop().pElement, expected()) << "seed " << uSeed;
         EXPECT_TRUE(m_queue.empty());
     }
 }

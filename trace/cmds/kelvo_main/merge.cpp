@@ -1,5 +1,6 @@
 #include "merge.h"
 
+#include "element_memory.h"
 #include "handover.h"
 #include "insufficient.h"
 #include "mutex.h"
@@ -39,12 +40,6 @@ struct taken_records {
     }
 };
 
-/// Formatting this record replaces its file's time base.
-bool changes_time_base(const trace_record_header& header) {
-    return header.function == TRC_FUNC_START || header.function == TRC_FUNC_TIME_CALIBRATION ||
-           header.function == TRC_FUNC_RESTART;
-}
-
 /// The merge rule.
 bool a_record_may_be_taken() {
     const bool bEveryRunningFileHasOne = ctrl.uFilesWithNothingQueued == 0;
@@ -57,9 +52,9 @@ bool is_waited_for(const trace_file* pTraceFile) {
     return pTraceFile->bRunning != 0 && pTraceFile->numRecPushed == 0;
 }
 
-trace_queue_element* take_record() {
-    trace_queue_element* const pElement = TrcOutput_Q.pop();
-    trace_file* const pFile = pElement->pFile;
+queue_entry take_record() {
+    const queue_entry entry = TrcOutput_Q.pop();
+    trace_file* const pFile = entry.pFile;
     --ctrl.queueDepth;
     pFile->bRecUnderProcess = 1;
     --pFile->numRecPushed;
@@ -67,7 +62,7 @@ trace_queue_element* take_record() {
         ++ctrl.uFilesWithNothingQueued;
     if (pFile->bWaitsForRoom && pFile->numRecPushed <= pFile->uRoomAt)
         pthread_cond_signal(&pFile->roomCond);
-    return pElement;
+    return entry;
 }
 
 /// Takes as many records in a row as the rule allows. A run ends at a record
@@ -76,16 +71,30 @@ void take_records(taken_records& taken) {
     const mutex_guard guard(ctrl.priorityQmutex);
     taken.uCount = 0;
     while (taken.uCount < MAX_TAKEN && a_record_may_be_taken()) {
-        trace_queue_element* const pElement = take_record();
-        taken.pElements[taken.uCount++] = pElement;
-        if (changes_time_base(pElement->header))
+        const queue_entry entry = take_record();
+        taken.pElements[taken.uCount++] = entry.pElement;
+        if (entry.bChangesBase)
             break;
     }
     taken.uDepthBehind = ctrl.queueDepth;
 }
 
+/// Has the processor fetch a record that will soon be formatted: it was written
+/// on another one, long ago.
+void fetch(const taken_records& taken, size_t uIndex) {
+    constexpr size_t LINE = 64;
+    if (uIndex >= taken.uCount)
+        return;
+    const auto* const pBytes = reinterpret_cast<const char*>(taken.pElements[uIndex]);
+    __builtin_prefetch(pBytes);
+    __builtin_prefetch(pBytes + LINE);
+}
+
 void format_records(taken_records& taken) {
-    for (trace_queue_element* pElement : taken.all()) {
+    constexpr size_t AHEAD = 4;
+    for (size_t uIndex = 0; uIndex < taken.uCount; ++uIndex) {
+        fetch(taken, uIndex + AHEAD);
+        trace_queue_element* const pElement = taken.pElements[uIndex];
         if (format_record(pElement) != 0)
             warn_insufficient_resources(pElement->pFile->pName, taken.uDepthBehind);
         write_handed_over_output();
@@ -100,7 +109,7 @@ void finish_records(taken_records& taken) {
         for (const trace_queue_element* pElement : taken.all()) {
             trace_file* const pFile = pElement->pFile;
             pFile->bRecUnderProcess = 0;
-            if (changes_time_base(pElement->header)) {
+            if (changes_time_base(pElement->header.function)) {
                 pFile->bTimeBaseInQueue = 0;
                 TrcOutput_Q.time_base_changed();
                 pthread_cond_signal(&pFile->roomCond);
@@ -108,8 +117,7 @@ void finish_records(taken_records& taken) {
         }
         pthread_cond_broadcast(&ctrl.priorityQcond);
     }
-    for (trace_queue_element* pElement : taken.all())
-        free(pElement);
+    release_elements(taken.all());
 }
 
 /// How long the main thread waits when it finds nothing to take: it lets others

@@ -54,15 +54,20 @@ int compare(cu_nanoseconds first, cu_nanoseconds second) {
 } // namespace
 
 queue_entry make_queue_entry(const trace_queue_element* pElement) {
-    const bool bOwnBase = pElement->header.function == TRC_FUNC_START;
-    return {pElement->header.timeStamp, pElement->pushSeqn,
-            bOwnBase ? nullptr : &pElement->pFile->timeInfo,
-            const_cast<trace_queue_element*>(pElement)};
+    const uint16_t uFunction = pElement->header.function;
+    queue_entry entry{};
+    entry.uTimeStamp = pElement->header.timeStamp;
+    entry.pushSeqn = pElement->pushSeqn & ((uint64_t{1} << 62) - 1);
+    entry.bOwnBase = uFunction == TRC_FUNC_START;
+    entry.bChangesBase = changes_time_base(uFunction);
+    entry.pFile = pElement->pFile;
+    entry.pElement = const_cast<trace_queue_element*>(pElement);
+    return entry;
 }
 
 cu_nanoseconds queue_entry_time(const queue_entry& entry) {
-    if (entry.pTimeInfo != nullptr)
-        return cu_time_ns(entry.uTimeStamp, *entry.pTimeInfo);
+    if (!entry.bOwnBase)
+        return cu_time_ns(entry.uTimeStamp, entry.pFile->timeInfo);
     const trace_record_header& header = entry.pElement->header;
     const trace_bytes record{reinterpret_cast<const std::byte*>(&header), header.length};
     return cu_time_ns(entry.uTimeStamp,
@@ -71,7 +76,7 @@ cu_nanoseconds queue_entry_time(const queue_entry& entry) {
 
 int cmp_queue_entries(const queue_entry& first, const queue_entry& second) {
     int iResult;
-    if (first.pTimeInfo == second.pTimeInfo && first.pTimeInfo != nullptr)
+    if (first.pFile == second.pFile && !first.bOwnBase && !second.bOwnBase)
         iResult = first.uTimeStamp < second.uTimeStamp ? -1 : first.uTimeStamp > second.uTimeStamp;
     else
         iResult = compare(queue_entry_time(first), queue_entry_time(second));
@@ -127,21 +132,21 @@ bool output_queue::push(trace_queue_element* pElement) {
     return true;
 }
 
-trace_queue_element* output_queue::pop() {
+queue_entry output_queue::pop() {
     if (empty())
-        return nullptr;
+        return {};
     if (m_late.uSize != 0 &&
         (m_heads.uSize == 0 || cmp_queue_entries(m_late.pEntries[0], m_heads.pEntries[0]) < 0))
-        return take_from_heap(m_late).pElement;
+        return take_from_heap(m_late);
 
-    trace_queue_element* const pElement = m_heads.pEntries[0].pElement;
-    queue_entries& ring = pElement->pFile->pQueuedRun->ring;
+    const queue_entry earliest = m_heads.pEntries[0];
+    queue_entries& ring = earliest.pFile->pQueuedRun->ring;
     ring.uFirst = (ring.uFirst + 1) & (ring.uCapacity - 1);
     if (--ring.uSize != 0)
         replace_top(m_heads, ring.at(0));
     else
         take_from_heap(m_heads);
-    return pElement;
+    return earliest;
 }
 
 void output_queue::time_base_changed() {

@@ -22,11 +22,20 @@
 
 /// What the order of a queued record is made of.
 struct queue_entry {
-    uint64_t uTimeStamp;          ///< raw
-    uint64_t pushSeqn;            ///< breaks ties
-    const cu_timeinfo* pTimeInfo; ///< time base; null: a start record, which carries its own
+    uint64_t uTimeStamp;       ///< raw
+    uint64_t pushSeqn : 62;    ///< breaks ties
+    uint64_t bOwnBase : 1;     ///< a start record, which carries its own time base
+    uint64_t bChangesBase : 1; ///< formatting it replaces the file's time base
+    trace_file* pFile;         ///< whose time base holds otherwise
     trace_queue_element* pElement;
 };
+static_assert(sizeof(queue_entry) == 32);
+
+/// Whether formatting a record of this kind replaces its file's time base.
+constexpr bool changes_time_base(uint16_t uFunction) {
+    return uFunction == TRC_FUNC_START || uFunction == TRC_FUNC_TIME_CALIBRATION ||
+           uFunction == TRC_FUNC_RESTART;
+}
 
 /// The entry of an element whose pFile, pushSeqn and record are filled in.
 queue_entry make_queue_entry(const trace_queue_element* pElement);
@@ -68,9 +77,9 @@ public:
     /// when memory ran out; the element then stays the caller's.
     bool push(trace_queue_element* pElement);
 
-    /// Takes the earliest element out, or null when the queue is empty. The
-    /// caller owns it from then on.
-    trace_queue_element* pop();
+    /// Takes the earliest entry out; its element is null when the queue is empty,
+    /// and otherwise the caller's from then on.
+    queue_entry pop();
 
     bool empty() const {
         return m_heads.uSize == 0 && m_late.uSize == 0;

@@ -1,5 +1,6 @@
 #include "reader.h"
 
+#include "element_memory.h"
 #include "first_record.h"
 #include "insufficient.h"
 #include "merge.h"
@@ -17,6 +18,7 @@
 #include <array>
 #include <cstdlib>
 #include <sched.h>
+#include <span>
 #include <unistd.h>
 
 namespace {
@@ -37,6 +39,7 @@ constexpr int64_t MAX_SHARES = 64;
 struct record_batch {
     std::array<trace_queue_element*, 256> pElements;
     size_t uCount = 0;
+    element_memory memory;
 };
 
 /// Diagnostic line of the low-memory mode.
@@ -103,8 +106,7 @@ bool push_element(trace_file* pTraceFile, trace_queue_element* pElement) {
         TrcFileProcessingCtrl(pElement, pTraceFile->index2 + 1);
     if (!TrcOutput_Q.push(pElement))
         return false;
-    if (pElement->header.function == TRC_FUNC_START ||
-        pElement->header.function == TRC_FUNC_TIME_CALIBRATION)
+    if (changes_time_base(pElement->header.function))
         pTraceFile->bTimeBaseInQueue = 1;
     if (pTraceFile->numRecPushed++ == 0)
         --ctrl.uFilesWithNothingQueued;
@@ -125,8 +127,7 @@ int push_batch(trace_file* pTraceFile, record_batch& batch) {
     const bool bFailed = uPushed < batch.uCount;
     if (bFailed)
         warn_insufficient_resources(pTraceFile->pName, batch.pElements[uPushed]->length);
-    for (; uPushed < batch.uCount; ++uPushed)
-        free(batch.pElements[uPushed]);
+    release_elements(std::span(batch.pElements).subspan(uPushed, batch.uCount - uPushed));
     batch.uCount = 0;
     return bFailed ? -1 : 0;
 }
@@ -136,7 +137,7 @@ int queue_record_for_formating(trace_file* pTraceFile, const trace_record_header
                                record_batch& batch) {
     if (batch.uCount == batch.pElements.size() && push_batch(pTraceFile, batch) != 0)
         return -1;
-    trace_queue_element* const pElement = copy_record(pTraceFile, header);
+    trace_queue_element* const pElement = copy_record(pTraceFile, header, &batch.memory);
     if (pElement == nullptr)
         return -1;
     batch.pElements[batch.uCount++] = pElement;

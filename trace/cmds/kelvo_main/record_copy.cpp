@@ -6,10 +6,12 @@
 #include <cstdlib>
 #include <cstring>
 
-trace_queue_element* copy_record(trace_file* pTraceFile, const trace_record_header& header) {
+trace_queue_element* copy_record(trace_file* pTraceFile, const trace_record_header& header,
+                                 element_memory* pMemory) {
     const trace_bytes record = record_bytes(pTraceFile, pTraceFile->pCurRec, header.length);
     const size_t uSize = record.size() + QUEUE_ELEMENT_OVERHEAD;
-    auto* const pElement = static_cast<trace_queue_element*>(malloc(uSize));
+    auto* const pElement = static_cast<trace_queue_element*>(
+        pMemory != nullptr ? pMemory->allocate(uSize) : malloc(uSize));
     if (pElement == nullptr) {
         warn_insufficient_resources(pTraceFile->pName, static_cast<int64_t>(uSize));
         return nullptr;

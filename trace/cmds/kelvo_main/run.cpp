@@ -1,6 +1,7 @@
 #include "run.h"
 
 #include "cleanup.h"
+#include "element_memory.h"
 #include "handover.h"
 #include "insufficient.h"
 #include "kelvo.h"
@@ -161,8 +162,10 @@ int process_files(const command_line& command) {
 /// The end of every run that no signal ended.
 int end_run(int bError) {
     bReadersMayRun = !endThrdPool();
-    if (!bReadersMayRun)
+    if (!bReadersMayRun) {
         TrcOutput_Q.release();
+        release_kept_blocks();
+    }
     cleanup(0);
     return bError;
 }

@@ -1,0 +1,140 @@
+#include "element_memory.h"
+
+#include "mutex.h"
+
+#include <atomic>
+#include <cstdint>
+#include <cstdlib>
+#include <new>
+
+/// A block starts at a multiple of its size, so that an element tells its block.
+struct element_block {
+    element_block* pNextKept;
+    std::atomic<uint32_t> uLive; ///< elements not yet released; UNCOUNTED more while it is filled
+};
+
+namespace {
+
+constexpr size_t BLOCK_SIZE = 64 * 1024;
+constexpr size_t FIRST_ELEMENT = 64; // behind the head of a block
+constexpr size_t ALIGNMENT = 16;
+constexpr size_t MAX_SMALL = 4096;
+constexpr uint32_t UNCOUNTED = 1U << 30;
+constexpr size_t MAX_KEPT = 64;
+static_assert(sizeof(element_block) <= FIRST_ELEMENT);
+
+#if defined(__SANITIZE_ADDRESS__)
+#define KELVO_ELEMENTS_APART 1
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define KELVO_ELEMENTS_APART 1
+#endif
+#endif
+#ifdef KELVO_ELEMENTS_APART
+constexpr bool ELEMENTS_APART = true; // so that reads beyond an element show
+#else
+constexpr bool ELEMENTS_APART = false;
+#endif
+
+bool is_small(size_t uSize) {
+    return !ELEMENTS_APART && uSize <= MAX_SMALL;
+}
+
+pthread_mutex_t kept_mutex = PTHREAD_MUTEX_INITIALIZER; // guards the kept blocks; taken last
+element_block* pFirstKept = nullptr;
+size_t uKept = 0;
+
+element_block* take_block() {
+    {
+        const mutex_guard guard(kept_mutex);
+        if (element_block* const pBlock = pFirstKept; pBlock != nullptr) {
+            pFirstKept = pBlock->pNextKept;
+            --uKept;
+            return pBlock;
+        }
+    }
+    void* const pMemory = std::aligned_alloc(BLOCK_SIZE, BLOCK_SIZE);
+    return pMemory != nullptr ? new (pMemory) element_block{} : nullptr;
+}
+
+void give_back(element_block* pBlock) {
+    {
+        const mutex_guard guard(kept_mutex);
+        if (uKept < MAX_KEPT) {
+            pBlock->pNextKept = pFirstKept;
+            pFirstKept = pBlock;
+            ++uKept;
+            return;
+        }
+    }
+    std::free(pBlock);
+}
+
+void count_down(element_block* pBlock, uint32_t uElements) {
+    if (pBlock->uLive.fetch_sub(uElements, std::memory_order_acq_rel) == uElements)
+        give_back(pBlock);
+}
+
+element_block* block_of(trace_queue_element* pElement) {
+    const auto uAddress = reinterpret_cast<uintptr_t>(pElement);
+    return reinterpret_cast<element_block*>(uAddress - uAddress % BLOCK_SIZE);
+}
+
+} // namespace
+
+element_memory::~element_memory() {
+    close_block();
+}
+
+void element_memory::close_block() {
+    if (m_pBlock != nullptr)
+        count_down(m_pBlock, UNCOUNTED - m_uElements);
+    m_pBlock = nullptr;
+}
+
+void* element_memory::allocate(size_t uSize) {
+    if (!is_small(uSize))
+        return std::malloc(uSize);
+    uSize = (uSize + ALIGNMENT - 1) / ALIGNMENT * ALIGNMENT;
+    if (m_pBlock == nullptr || uSize > BLOCK_SIZE - m_uUsed) {
+        close_block();
+        m_pBlock = take_block();
+        if (m_pBlock == nullptr)
+            return nullptr;
+        m_pBlock->uLive.store(UNCOUNTED, std::memory_order_relaxed);
+        m_uUsed = FIRST_ELEMENT;
+        m_uElements = 0;
+    }
+    std::byte* const pRoom = reinterpret_cast<std::byte*>(m_pBlock) + m_uUsed;
+    m_uUsed += uSize;
+    ++m_uElements;
+    return pRoom;
+}
+
+void release_elements(std::span<trace_queue_element*> elements) {
+    element_block* pBlock = nullptr;
+    uint32_t uOfBlock = 0;
+    for (trace_queue_element* pElement : elements) {
+        if (!is_small(pElement->length)) {
+            std::free(pElement);
+            continue;
+        }
+        if (block_of(pElement) != pBlock && uOfBlock != 0) {
+            count_down(pBlock, uOfBlock);
+            uOfBlock = 0;
+        }
+        pBlock = block_of(pElement);
+        ++uOfBlock;
+    }
+    if (uOfBlock != 0)
+        count_down(pBlock, uOfBlock);
+}
+
+void release_kept_blocks() {
+    while (pFirstKept != nullptr) {
+        element_block* const pBlock = pFirstKept;
+        pFirstKept = pBlock->pNextKept;
+        std::free(pBlock);
+    }
+    uKept = 0;
+}
