@@ -7,6 +7,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
 #include <random>
 #include <unistd.h>
 
@@ -67,8 +68,22 @@ protected:
 
 constexpr int TERMINATING[] = {SIGINT, SIGQUIT, SIGTSTP, SIGTTIN, SIGTTOU, SIGPIPE};
 
+/// Waits until the process has handlers of its own.
+void wait_until_armed(pid_t pid) {
+    const uint64_t uWanted = uint64_t{1} << (SIGPIPE - 1) | uint64_t{1} << (SIGTTOU - 1);
+    for (int i = 0; i < 60'000; ++i) {
+        std::ifstream status("/proc/" + std::to_string(pid) + "/status");
+        for (std::string sLine; std::getline(status, sLine);)
+            if (sLine.starts_with("SigCgt:") &&
+                (strtoull(sLine.c_str() + 7, nullptr, 16) & uWanted) == uWanted)
+                return;
+        usleep(1000);
+    }
+    ADD_FAILURE() << "no handlers";
+}
+
 TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
-    const uint64_t uTimes = setting("KELVO_TEST_LIVE_SIGNALS", 8);
+    const uint64_t uTimes = setting("KELVO_TEST_LIVE_SIGNALS", 9);
     live_command writer = start_writer();
     writer.read_line_with("ready");
     for (uint64_t i = 0; i < uTimes; ++i)
@@ -76,18 +91,23 @@ TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
             SCOPED_TRACE(strsignal(signo));
             live_command kelvo = start_following();
             record_stream stream(kelvo);
-            stream.next();
-            const useconds_t moment = up_to(40'000);
-            if (i % 2 == 0) { // while its reader keeps up
-                for (const uint64_t uEnough = stream.count() + moment / 4;
-                     stream.count() < uEnough && stream.next();)
+            switch (i % 3) {
+            case 0: // from the moment on at which it can take signals
+                wait_until_armed(kelvo.pid());
+                usleep(up_to(60'000));
+                break;
+            case 1: // while its reader keeps up
+                for (const uint64_t uEnough = up_to(10'000);
+                     stream.next() && stream.count() < uEnough;)
                     ;
-                kelvo.send_signal(signo);
-            } else { // while nobody reads
-                usleep(moment);
-                kelvo.send_signal(signo);
-                usleep(up_to(5000));
+                break;
+            case 2: // while nobody reads
+                stream.next();
+                usleep(up_to(40'000));
+                break;
             }
+            kelvo.send_signal(signo);
+            usleep(up_to(5000));
             stream.drain();
             const command_result result = kelvo.wait();
             EXPECT_EQ(result.status, 0) << "signal " << result.signo;
