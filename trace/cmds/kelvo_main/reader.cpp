@@ -166,15 +166,14 @@ void wait_for_number(const trace_file* pTraceFile, trace_record_header& header) 
 }
 
 void read_records(trace_file* pTraceFile, record_batch& batch) {
-    while (!pTraceFile->bDone) {
-        trace_record_header header;
-        const walk_result here = is_last_record(pTraceFile, &header);
-        if (here == WALK_CORRUPT)
-            return;
+    trace_record_header header;
+    walk_result here = is_last_record(pTraceFile, &header);
+    while (!pTraceFile->bDone && here != WALK_CORRUPT) {
         if (here == WALK_NO_RECORD) {
             if (!anchor.bFollow || push_batch(pTraceFile, batch) != 0)
                 return;
             usleep(FOLLOW_WAIT_US);
+            here = is_last_record(pTraceFile, &header);
             continue;
         }
         if (is_for_output(header) && start_is_reached(pTraceFile, header)) {
@@ -182,8 +181,7 @@ void read_records(trace_file* pTraceFile, record_batch& batch) {
             if (queue_record_for_formating(pTraceFile, header, batch) != 0)
                 return;
         }
-        if (step_to_next_record(pTraceFile, header) == WALK_CORRUPT)
-            return;
+        here = step_and_judge(pTraceFile, &header);
     }
 }
 

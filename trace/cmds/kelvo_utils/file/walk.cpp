@@ -46,6 +46,46 @@ bool has_caught_up(const trace_file* pTraceFile, const trace_record_header& head
     return !counts_in_sequence(header) && pTraceFile->uUncountedBytes >= ring_size(pTraceFile);
 }
 
+/// What is_last_record says of the sound record at pCurRec. `uOldest` was read
+/// before its header.
+walk_result judge_position(const trace_file* pTraceFile, uint32_t uOldest,
+                           const trace_record_header& header) {
+    if (!ring_holds_header(pTraceFile, uOldest)) [[unlikely]] {
+        warn_out_of_bounds(pTraceFile, ring_position(pTraceFile, uOldest));
+        return WALK_CORRUPT;
+    }
+    const uint32_t uOffset = get_record_offset(pTraceFile, pTraceFile->pCurRec);
+    if (load_actual_file_size(pTraceFile->pHeader) < uOffset) [[unlikely]] {
+        warn_beyond_file_size(uOffset);
+        return WALK_NO_RECORD;
+    }
+    if (uOffset < uOldest && uOffset + header.length > uOldest) [[unlikely]] {
+        warn_runs_over_oldest(uOffset, header);
+        return WALK_NO_RECORD;
+    }
+    if (uOffset == uOldest && has_caught_up(pTraceFile, header))
+        return WALK_NO_RECORD;
+    return WALK_RECORD;
+}
+
+/// Moves pCurRec past the record; the new position is not yet tested.
+void move_past(trace_file* pTraceFile, const trace_record_header& current) {
+    uint64_t uNext = ring_offset(pTraceFile, pTraceFile->pCurRec) + current.length;
+    if (uNext == ring_end(pTraceFile))
+        uNext = ring_start(pTraceFile);
+    pTraceFile->pCurRec = ring_position(pTraceFile, uNext);
+}
+
+/// Lets the writer know that the record was passed.
+void count_as_passed(trace_file* pTraceFile, const trace_record_header& passed) {
+    if (counts_in_sequence(passed)) {
+        pTraceFile->uUncountedBytes = 0;
+        store_seq_lock(pTraceFile->pHeader, load_seq_lock(pTraceFile->pHeader) + 2);
+    } else {
+        pTraceFile->uUncountedBytes += passed.length;
+    }
+}
+
 } // namespace
 
 uint32_t get_record_offset(const trace_file* pTraceFile, const trace_record_header* pRec) {
@@ -93,22 +133,7 @@ walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pH
     const uint32_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
     if (current_record_pointer_is_bad(pTraceFile, pHeader))
         return WALK_CORRUPT;
-    if (!ring_holds_header(pTraceFile, uOldest)) [[unlikely]] {
-        warn_out_of_bounds(pTraceFile, ring_position(pTraceFile, uOldest));
-        return WALK_CORRUPT;
-    }
-    const uint32_t uOffset = get_record_offset(pTraceFile, pTraceFile->pCurRec);
-    if (load_actual_file_size(pTraceFile->pHeader) < uOffset) [[unlikely]] {
-        warn_beyond_file_size(uOffset);
-        return WALK_NO_RECORD;
-    }
-    if (uOffset < uOldest && uOffset + pHeader->length > uOldest) [[unlikely]] {
-        warn_runs_over_oldest(uOffset, *pHeader);
-        return WALK_NO_RECORD;
-    }
-    if (uOffset == uOldest && has_caught_up(pTraceFile, *pHeader))
-        return WALK_NO_RECORD;
-    return WALK_RECORD;
+    return judge_position(pTraceFile, uOldest, *pHeader);
 }
 
 bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader) {
@@ -124,21 +149,22 @@ bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader)
 }
 
 walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current) {
-    uint64_t uNext = ring_offset(pTraceFile, pTraceFile->pCurRec) + current.length;
-    if (uNext == ring_end(pTraceFile))
-        uNext = ring_start(pTraceFile);
-    pTraceFile->pCurRec = ring_position(pTraceFile, uNext);
-
     trace_record_header next;
+    move_past(pTraceFile, current);
     if (current_record_pointer_is_bad(pTraceFile, &next))
         return WALK_CORRUPT;
-    if (counts_in_sequence(current)) {
-        pTraceFile->uUncountedBytes = 0;
-        store_seq_lock(pTraceFile->pHeader, load_seq_lock(pTraceFile->pHeader) + 2);
-    } else {
-        pTraceFile->uUncountedBytes += current.length;
-    }
+    count_as_passed(pTraceFile, current);
     return WALK_RECORD;
+}
+
+walk_result step_and_judge(trace_file* pTraceFile, trace_record_header* pHeader) {
+    const trace_record_header passed = *pHeader;
+    move_past(pTraceFile, passed);
+    const uint32_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
+    if (current_record_pointer_is_bad(pTraceFile, pHeader))
+        return WALK_CORRUPT;
+    count_as_passed(pTraceFile, passed);
+    return judge_position(pTraceFile, uOldest, *pHeader);
 }
 
 walk_result get_next_record(trace_file* pTraceFile) {

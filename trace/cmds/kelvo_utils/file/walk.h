@@ -61,6 +61,10 @@ bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader)
 /// past the record: from then on the writer may overwrite it.
 walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current);
 
+/// step_to_next_record past the record whose judged copy is `*pHeader`, then
+/// is_last_record at the new position, with one look at its header.
+walk_result step_and_judge(trace_file* pTraceFile, trace_record_header* pHeader);
+
 /// is_last_record, then the step. On WALK_NO_RECORD no step was taken; on
 /// WALK_CORRUPT none was taken or the new position is bad.
 walk_result get_next_record(trace_file* pTraceFile);
