@@ -10,13 +10,27 @@
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace {
+
+/// A trace file on the number of a standard stream that came closed would be
+/// printed into. Returns a number above them for the same file, or -1 with errno.
+int above_standard_descriptors(int fd) {
+    if (fd < 0 || fd > STDERR_FILENO)
+        return fd;
+    const int higher = fcntl(fd, F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
+    const int savedErrno = errno;
+    close(fd);
+    errno = savedErrno;
+    return higher;
+}
 
 /// O_NONBLOCK and O_NOCTTY mean nothing to a regular file; they keep the open
 /// of a terminal line or another device from waiting or taking it over.
 int open_file(trace_file* pTraceFile) {
-    pTraceFile->fd = open(pTraceFile->pName, O_RDWR | O_CLOEXEC | O_NONBLOCK | O_NOCTTY);
+    pTraceFile->fd = above_standard_descriptors(
+        open(pTraceFile->pName, O_RDWR | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
     if (pTraceFile->fd >= 0)
         return 0;
     output_sys_message("%s: 2625-102 Error opening file \"%s\",", errno, anchor.pProgName,
