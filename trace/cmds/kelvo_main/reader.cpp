@@ -32,6 +32,13 @@ constexpr int LOOKS_BEFORE_SLEEPING = 20;
 constexpr useconds_t NUMBER_WAIT_US = 100;
 constexpr int NUMBER_WAITS = 50; // a writer that was killed stores no number any more
 
+/// With as many files running, a reader that has come to its end starts the next
+/// one only when its own records are printed. (No record waits for that: one that
+/// is not earlier than the next file's starts it before it is queued.) Otherwise
+/// a long row of short files would be open all at once, each started by the last
+/// before the main thread gets to print anything.
+constexpr uint32_t ENOUGH_RUNNING_FILES = 16;
+
 /// More files than this at once do not make a file's share of the cap smaller.
 constexpr int64_t MAX_SHARES = 64;
 
@@ -195,9 +202,10 @@ void wait_until_drained(const trace_file* pTraceFile) {
 void end_reading(trace_file* pTraceFile) {
     {
         const mutex_guard guard(ctrl.priorityQmutex);
-        if (!anchor.bFollow)
+        if (ctrl.uRunningFiles < ENOUGH_RUNNING_FILES)
             TrcFileProcessingCtrl(nullptr, pTraceFile->index2 + 1);
         wait_until_drained(pTraceFile);
+        TrcFileProcessingCtrl(nullptr, pTraceFile->index2 + 1);
         if (!anchor.bFollow)
             kelvo_progress_status();
     }
