@@ -9,6 +9,7 @@
 #include <poll.h>
 #include <string_view>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <utility>
@@ -230,15 +231,17 @@ void live_command::close_output() {
 /// Collects the end of the program, which has closed its streams.
 void live_command::reap(int64_t iDeadline) {
     int state = 0;
-    while (waitpid(m_pid, &state, WNOHANG) == 0) {
+    rusage usage{};
+    while (wait4(m_pid, &state, WNOHANG, &usage) == 0) {
         if (now_ms() > iDeadline) {
             give_up("did not end");
-            waitpid(m_pid, &state, 0);
+            wait4(m_pid, &state, 0, &usage);
             break;
         }
         usleep(1000);
     }
     m_pid = -1;
+    m_result.peakKiB = usage.ru_maxrss;
     if (WIFEXITED(state))
         m_result.status = WEXITSTATUS(state);
     if (WIFSIGNALED(state))

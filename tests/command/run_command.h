@@ -23,8 +23,9 @@ struct command_setup {
 struct command_result {
     std::string sOut;
     std::string sErr;
-    int status = -1; ///< exit status; -1 when a signal ended the program
-    int signo = 0;   ///< that signal
+    int status = -1;  ///< exit status; -1 when a signal ended the program
+    int signo = 0;    ///< that signal
+    long peakKiB = 0; ///< most memory that was resident at once, mapped files included
 };
 
 /// A program that runs while the test goes on. Its output is read only by the
