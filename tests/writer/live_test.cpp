@@ -298,7 +298,7 @@ TEST_P(live_stress, reader_sees_every_record_once_and_in_order) {
         ASSERT_LE(seen.size(), static_cast<size_t>(accepted.end() - pFirst));
         EXPECT_EQ(numbers(pFirst, pFirst + static_cast<ptrdiff_t>(seen.size())), seen);
     }
-    EXPECT_GT(uSeen, 40U);
+    EXPECT_GT(uSeen, 0U); // how many is a matter of scheduling
     EXPECT_EQ(accepted.size() + writer.counts().uDiscards, writer.counts().uAppended);
     EXPECT_EQ(accepted.size() + writer.counts().uDropped, APPENDS);
 }
