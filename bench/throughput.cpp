@@ -1,0 +1,321 @@
+// Runs kelvo and the floor in turn over traces made for the purpose, and prints
+// what both cost and how they compare. See --help.
+#include "child.h"
+#include "follow.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <getopt.h>
+#include <string>
+#include <string_view>
+#include <unistd.h>
+#include <vector>
+
+namespace {
+
+constexpr char HELP[] = R"(Usage: kelvo_throughput [option...]
+Compares kelvo with a plain loop over the same mapped files that writes the same
+bytes (kelvo_floor), after a check that the bytes are the same.
+
+  --records=N    records of the large inputs (default 5000000)
+  --repeat=N     runs of each program; medians are printed (default 5)
+  --only=TEXT    only the inputs whose name contains TEXT
+  --output=WHERE what the measured programs write to: null (/dev/null, the
+                 default), pipe (a pipe that is read as fast as it comes) or
+                 file (in the temporary directory)
+  --linearity    also the table over 0.5 to 20 million records
+  --follow[=S]   also the cost of following 8 idle files for S seconds
+                 (default 30), and how soon a record then comes out
+  --all          both
+  --none         none of the comparisons: with --linearity or --follow
+  --quick        a hundredth of the records, one run each, follows for 2 seconds
+  --kelvo=FILE   measure this program (default: the one built beside)
+  --temp=DIR     where inputs are made (default $TMPDIR or /tmp); they need up
+                 to 0.4 GB at a time, 1.4 GB with --linearity
+)";
+
+struct settings {
+    uint64_t uRecords = 5'000'000;
+    unsigned uRepeat = 5;
+    std::string only;
+    output_target target = output_target::NULL_DEVICE;
+    std::string sTarget = "/dev/null";
+    bool bComparisons = true;
+    bool bLinearity = false;
+    bool bFollow = false;
+    bool bQuick = false;
+    unsigned uFollowSeconds = 30;
+    std::string kelvo = KELVO_PROGRAM;
+    std::string temp;
+};
+
+/// An input of the comparison.
+struct input {
+    const char* pName;
+    const char* pProfile; ///< of kelvo_sample; "values": records of 64 bytes
+    unsigned uFiles;
+    unsigned uShare; ///< one in so many of the records asked for
+    bool bSequential;
+    bool bRaw;
+};
+constexpr input INPUTS[] = {
+    {"one file", "values", 1, 1, false, false},
+    {"8 files interleaved", "values", 8, 1, false, false},
+    {"64 files interleaved", "values", 64, 1, false, false},
+    {"300 files in a row", "values", 300, 1, true, false},
+    {"three numbers, a string", "numbers", 1, 1, false, false},
+    {"two strings, 128 bytes", "strings", 1, 2, false, false},
+    {"raw values", "values", 1, 5, false, true},
+    {"raw data blocks", "numbers", 1, 10, false, true},
+};
+
+/// A directory that goes with everything in it.
+class temp_directory {
+public:
+    explicit temp_directory(const std::string& sParent) : sPath(sParent + "/kelvo-bench-XXXXXX") {
+        if (mkdtemp(sPath.data()) == nullptr)
+            give_up("cannot make a directory in " + sParent);
+    }
+    temp_directory(const temp_directory&) = delete;
+    temp_directory& operator=(const temp_directory&) = delete;
+    ~temp_directory() {
+        std::error_code error;
+        std::filesystem::remove_all(sPath, error);
+    }
+    const std::string& path() const {
+        return sPath;
+    }
+
+private:
+    std::string sPath;
+};
+
+/// Makes the traces of an input, `uRecords` in all as far as the files divide
+/// them. Returns how many there are.
+uint64_t make_input(const input& in, uint64_t uRecords, const std::string& sDirectory) {
+    const uint64_t uPerFile = std::max<uint64_t>(uRecords / in.uFiles, 1);
+    const std::string sTimes = in.bSequential ? "sequential" : "interleave";
+    if (std::string_view(in.pProfile) == "values")
+        run_quietly({MAKE_VALUES_PROGRAM, sDirectory, std::to_string(in.uFiles),
+                     std::to_string(uPerFile), sTimes});
+    else
+        run_quietly({SAMPLE_PROGRAM, "--directory=" + sDirectory,
+                     std::string("--profile=") + in.pProfile,
+                     "--files=" + std::to_string(in.uFiles),
+                     "--records=" + std::to_string(uPerFile), "--times=" + sTimes});
+    return uPerFile * in.uFiles;
+}
+
+/// kelvo (0) and the floor (1) as they are run.
+struct program_pair {
+    command_words words[2];
+
+    program_pair(const settings& options, const input& in, const std::string& sDirectory) {
+        words[0] = {options.kelvo, "-t", sDirectory};
+        words[1] = {FLOOR_PROGRAM};
+        if (in.bRaw) {
+            words[0].push_back("-r");
+            words[1].push_back("-r");
+        }
+        std::vector<std::string> traces;
+        for (const auto& entry : std::filesystem::directory_iterator(sDirectory))
+            if (entry.path().extension() == ".trc")
+                traces.push_back(entry.path());
+        std::sort(traces.begin(), traces.end());
+        for (command_words& program : words)
+            program.insert(program.end(), traces.begin(), traces.end());
+    }
+};
+
+double median(std::vector<double> values) {
+    std::sort(values.begin(), values.end());
+    const size_t uHalf = values.size() / 2;
+    return values.size() % 2 != 0 ? values[uHalf] : (values[uHalf - 1] + values[uHalf]) / 2;
+}
+
+/// Median of a figure of one program.
+double median_of(const std::vector<run_cost>& runs, double run_cost::*pFigure) {
+    std::vector<double> values;
+    for (const run_cost& run : runs)
+        values.push_back(run.*pFigure);
+    return median(values);
+}
+
+/// Median of the ratios of runs that followed each other: on a busy machine
+/// they suffer alike.
+double median_ratio(const std::vector<run_cost> (&runs)[2], double run_cost::*pFigure) {
+    std::vector<double> ratios;
+    for (size_t i = 0; i < runs[0].size(); ++i)
+        ratios.push_back(runs[0][i].*pFigure / std::max(runs[1][i].*pFigure, 1e-6));
+    return median(ratios);
+}
+
+/// Five runs of each of the two, in turn.
+void run_in_turn(const settings& options, const program_pair& programs,
+                 const std::string& sDirectory, std::vector<run_cost> (&runs)[2]) {
+    for (unsigned u = 0; u < options.uRepeat; ++u)
+        for (size_t i = 0; i < 2; ++i)
+            runs[i].push_back(
+                run_measured(programs.words[i], options.target, sDirectory + "/output.txt"));
+}
+
+constexpr double MIB = 1024.0 * 1024;
+
+void print_heading(const settings& options) {
+    printf("Output to %s, medians of %u run%s, programs in turn.\n\n", options.sTarget.c_str(),
+           options.uRepeat, options.uRepeat == 1 ? "" : "s");
+    printf("%-24s %-6s %8s %8s %8s %9s %9s %9s %7s %7s\n", "input", "", "Mrec", "wall s", "CPU s",
+           "Mrec/s", "resident", "private", "wall", "CPU");
+    printf("%-24s %-6s %8s %8s %8s %9s %9s %9s %7s %7s\n", "", "", "", "", "", "", "MiB", "MiB",
+           "ratio", "ratio");
+}
+
+void compare(const settings& options, const input& in) {
+    const temp_directory directory(options.temp);
+    const uint64_t uRecords = make_input(in, options.uRecords / in.uShare, directory.path());
+    const program_pair programs(options, in, directory.path());
+    const comparison same = compare_outputs(programs.words[0], programs.words[1]);
+
+    std::vector<run_cost> runs[2];
+    run_in_turn(options, programs, directory.path(), runs);
+    const auto millions = static_cast<double>(uRecords) / 1e6;
+    for (size_t i = 0; i < 2; ++i) {
+        const double wall = median_of(runs[i], &run_cost::wall);
+        printf("%-24s %-6s %8.3f %8.3f %8.3f %9.3f %9.1f %9.1f", i == 0 ? in.pName : "",
+               i == 0 ? "kelvo" : "floor", millions, wall, median_of(runs[i], &run_cost::cpu),
+               millions / wall, median_of(runs[i], &run_cost::maxResident) / MIB,
+               static_cast<double>(same.uPrivate[i]) / MIB);
+        if (i == 0)
+            printf(" %7.2f %7.2f", median_ratio(runs, &run_cost::wall),
+                   median_ratio(runs, &run_cost::cpu));
+        printf("\n");
+    }
+    fflush(stdout);
+}
+
+void measure_linearity(const settings& options) {
+    printf("\nOne file of 64-byte records, output to %s, medians of %u:\n\n"
+           "%8s %8s %8s %10s %10s %9s %9s\n",
+           options.sTarget.c_str(), options.uRepeat, "Mrec", "wall s", "CPU s", "wall ns/rec",
+           "CPU ns/rec", "resident", "CPU ratio");
+    for (const uint64_t uThousands : {500, 1000, 2000, 5000, 10'000, 20'000}) {
+        const temp_directory directory(options.temp);
+        const uint64_t uRecords =
+            make_input(INPUTS[0], uThousands * (options.bQuick ? 10 : 1000), directory.path());
+        const program_pair programs(options, INPUTS[0], directory.path());
+        std::vector<run_cost> runs[2];
+        run_in_turn(options, programs, directory.path(), runs);
+        const double wall = median_of(runs[0], &run_cost::wall);
+        const double cpu = median_of(runs[0], &run_cost::cpu);
+        const auto records = static_cast<double>(uRecords);
+        printf("%8.3f %8.3f %8.3f %11.1f %10.1f %9.1f %9.2f\n", records / 1e6, wall, cpu,
+               wall * 1e9 / records, cpu * 1e9 / records,
+               median_of(runs[0], &run_cost::maxResident) / MIB,
+               median_ratio(runs, &run_cost::cpu));
+        fflush(stdout);
+    }
+}
+
+// ----------------------------------------------------------------- options
+
+bool read_target(std::string_view text, settings* pOptions) {
+    pOptions->target = text == "pipe"   ? output_target::PIPE
+                       : text == "file" ? output_target::REGULAR_FILE
+                                        : output_target::NULL_DEVICE;
+    pOptions->sTarget = text == "pipe" ? "a pipe" : text == "file" ? "a file" : "/dev/null";
+    return text == "pipe" || text == "file" || text == "null";
+}
+
+bool read_option(char letter, const std::string& sValue, settings* pOptions) {
+    switch (letter) {
+    case 'n':
+        pOptions->uRecords = strtoull(sValue.c_str(), nullptr, 10);
+        return pOptions->uRecords != 0;
+    case 'c':
+        pOptions->uRepeat = static_cast<unsigned>(strtoul(sValue.c_str(), nullptr, 10));
+        return pOptions->uRepeat != 0;
+    case 'w':
+        pOptions->only = sValue;
+        return true;
+    case 'o':
+        return read_target(sValue, pOptions);
+    case 'l':
+        return pOptions->bLinearity = true;
+    case 'f':
+        if (!sValue.empty())
+            pOptions->uFollowSeconds = static_cast<unsigned>(strtoul(sValue.c_str(), nullptr, 10));
+        return pOptions->bFollow = pOptions->uFollowSeconds != 0;
+    case 'a':
+        return pOptions->bLinearity = pOptions->bFollow = true;
+    case '0':
+        pOptions->bComparisons = false;
+        return true;
+    case 'q':
+        pOptions->uRecords = 50'000;
+        pOptions->uRepeat = 1;
+        pOptions->uFollowSeconds = 2;
+        return pOptions->bQuick = true;
+    case 'k':
+        pOptions->kelvo = sValue;
+        return true;
+    case 't':
+        pOptions->temp = sValue;
+        return true;
+    default:
+        return false;
+    }
+}
+
+settings read_options(int argc, char** argv) {
+    static constexpr option OPTIONS[] = {
+        {"records", required_argument, nullptr, 'n'},
+        {"repeat", required_argument, nullptr, 'c'},
+        {"only", required_argument, nullptr, 'w'},
+        {"output", required_argument, nullptr, 'o'},
+        {"linearity", no_argument, nullptr, 'l'},
+        {"follow", optional_argument, nullptr, 'f'},
+        {"all", no_argument, nullptr, 'a'},
+        {"none", no_argument, nullptr, '0'},
+        {"quick", no_argument, nullptr, 'q'},
+        {"kelvo", required_argument, nullptr, 'k'},
+        {"temp", required_argument, nullptr, 't'},
+        {"help", no_argument, nullptr, 'h'},
+        {nullptr, 0, nullptr, 0},
+    };
+    settings options;
+    const char* const pTemp = getenv("TMPDIR");
+    options.temp = pTemp != nullptr && *pTemp != '\0' ? pTemp : "/tmp";
+    for (int code; (code = getopt_long(argc, argv, "", OPTIONS, nullptr)) != -1;) {
+        const bool bGood =
+            read_option(static_cast<char>(code), optarg != nullptr ? optarg : "", &options);
+        if (!bGood) {
+            fputs(HELP, code == 'h' ? stdout : stderr);
+            exit(code == 'h' ? 0 : 1);
+        }
+    }
+    if (optind != argc)
+        give_up(std::string("unexpected argument ") + argv[optind]);
+    return options;
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    const settings options = read_options(argc, argv);
+    setenv("LC_ALL", "C", 1); // the floor writes times as this locale does
+    if (options.bComparisons) {
+        print_heading(options);
+        for (const input& in : INPUTS)
+            if (std::string_view(in.pName).find(options.only) != std::string_view::npos)
+                compare(options, in);
+    }
+    if (options.bLinearity)
+        measure_linearity(options);
+    if (options.bFollow) {
+        const temp_directory directory(options.temp);
+        measure_follow(options.kelvo, directory.path(), options.uFollowSeconds);
+    }
+    return 0;
+}
