@@ -245,6 +245,7 @@ hostile_result read_hostile_file(trace_bytes bytes, const hostile_options& optio
     const auto header = load<trace_file_header>(bytes, 0);
     file.addrMode64 = (header.uProperties & TRC_PROP_ADDR_64) != 0;
     result.bAccepted = open_file(&file, header);
+    stdout_reset(); // the summary goes no further
 
     reading run{&file, options, result};
     result.end = read_file(run);
