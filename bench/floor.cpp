@@ -7,6 +7,7 @@
 // templates are compiled in; there are no threads, no queue, no copies of
 // records, no nesting, no locks on files. Checked is only what keeps a walk
 // inside its mapping, so a damaged file ends the program.
+#include "floor_merge.h"
 #include "floor_output.h"
 #include "floor_text.h"
 #include "floor_trace.h"
@@ -18,27 +19,6 @@
 #include <vector>
 
 namespace {
-
-/// One number that the merge compares in place of the trace behind it.
-struct merge_head {
-    uint64_t uTime;
-    floor_trace* pTrace;
-};
-
-/// Makes `head` the new top of the heap of `uSize` heads, or the entry below
-/// which it belongs.
-void replace_top(merge_head* pHeads, size_t uSize, const merge_head& head) {
-    size_t uHole = 0;
-    for (size_t uChild = 1; uChild < uSize; uChild = 2 * uHole + 1) {
-        const size_t uRight = std::min(uChild + 1, uSize - 1);
-        uChild = pHeads[uRight].uTime < pHeads[uChild].uTime ? uRight : uChild;
-        if (head.uTime <= pHeads[uChild].uTime)
-            break;
-        pHeads[uHole] = pHeads[uChild];
-        uHole = uChild;
-    }
-    pHeads[uHole] = head;
-}
 
 /// Writes the records of `pTrace` as long as they are earlier than `uUntil`.
 /// False when the trace has come to its end.
@@ -53,34 +33,26 @@ bool write_run(floor_output& out, record_text& text, floor_trace& trace, uint64_
     return true;
 }
 
-/// Writes all records of all traces in the order of their times. `traces` are
-/// sorted by their first record; one that has not begun costs nothing.
+/// Writes all records of all traces in the order of their times.
 template <class put_body>
-void write_records(floor_output& out, record_text& text, std::vector<floor_trace*> traces) {
-    std::vector<merge_head> heads(traces.size());
-    size_t uHeads = 0;
-    size_t uNext = 0;
-    while (uHeads != 0 || uNext != traces.size()) {
-        const bool bBegin =
-            uNext != traces.size() && (uHeads == 0 || traces[uNext]->time() < heads[0].uTime);
-        if (bBegin) {
-            heads[uHeads++] = {traces[uNext]->time(), traces[uNext]};
-            ++uNext;
-            std::push_heap(heads.data(), heads.data() + uHeads,
-                           [](const auto& a, const auto& b) { return a.uTime > b.uTime; });
-            continue;
-        }
-        floor_trace& trace = *heads[0].pTrace;
-        uint64_t uUntil = uNext != traces.size() ? traces[uNext]->time() : UINT64_MAX;
-        for (size_t u = 1; u < std::min<size_t>(uHeads, 3); ++u)
-            uUntil = std::min(uUntil, heads[u].uTime);
+void write_records(floor_output& out, record_text& text, const std::vector<floor_trace*>& traces) {
+    std::vector<uint64_t> times;
+    for (const floor_trace* pTrace : traces)
+        times.push_back(pTrace->time());
+    floor_merge merge(times);
+    size_t uLast = SIZE_MAX;
+    while (merge.time() != UINT64_MAX) {
+        const size_t uFirst = merge.first();
+        floor_trace& trace = *traces[uFirst];
+        // Where one trace gives many records in a row, the rest need no look.
+        const uint64_t uUntil = uFirst == uLast ? merge.second_time() : 0;
+        uLast = uFirst;
         if (write_run<put_body>(out, text, trace, uUntil)) {
             trace.fetch_ahead();
-            replace_top(heads.data(), uHeads, {trace.time(), &trace});
+            merge.replace_first(trace.time());
         } else {
             trace.close();
-            --uHeads;
-            replace_top(heads.data(), uHeads, heads[uHeads]);
+            merge.replace_first(UINT64_MAX);
         }
     }
 }
@@ -132,8 +104,6 @@ int main(int argc, char** argv) {
     }
     const int iMinutesWest = files[0].header().tz_offset;
     write_time_zone(out, iMinutesWest);
-    std::stable_sort(traces.begin(), traces.end(),
-                     [](const auto* pA, const auto* pB) { return pA->time() < pB->time(); });
     record_text text(iMinutesWest, iFiles > 1);
     if (bRaw)
         write_records<put_raw>(out, text, traces);

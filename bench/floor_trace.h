@@ -81,11 +81,10 @@ public:
         return true;
     }
 
-    /// Has the processor fetch what will be read the next time round.
+    /// Has the processor fetch the record behind this one.
     void fetch_ahead() const {
-        __builtin_prefetch(pMap + uAt);
-        __builtin_prefetch(pMap + uAt + 64);
-        __builtin_prefetch(pMap + uAt + 128);
+        __builtin_prefetch(pMap + uAt + uLength);
+        __builtin_prefetch(pMap + uAt + uLength + 64);
     }
 
     /// Of the record, nanoseconds since the epoch.
