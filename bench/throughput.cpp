@@ -2,6 +2,7 @@
 // what both cost and how they compare. See --help.
 #include "child.h"
 #include "follow.h"
+#include "temp_directory.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -10,7 +11,6 @@
 #include <getopt.h>
 #include <string>
 #include <string_view>
-#include <unistd.h>
 #include <vector>
 
 namespace {
@@ -69,27 +69,6 @@ constexpr input INPUTS[] = {
     {"two strings, 128 bytes", "strings", 1, 2, false, false},
     {"raw values", "values", 1, 5, false, true},
     {"raw data blocks", "numbers", 1, 10, false, true},
-};
-
-/// A directory that goes with everything in it.
-class temp_directory {
-public:
-    explicit temp_directory(const std::string& sParent) : sPath(sParent + "/kelvo-bench-XXXXXX") {
-        if (mkdtemp(sPath.data()) == nullptr)
-            give_up("cannot make a directory in " + sParent);
-    }
-    temp_directory(const temp_directory&) = delete;
-    temp_directory& operator=(const temp_directory&) = delete;
-    ~temp_directory() {
-        std::error_code error;
-        std::filesystem::remove_all(sPath, error);
-    }
-    const std::string& path() const {
-        return sPath;
-    }
-
-private:
-    std::string sPath;
 };
 
 /// Makes the traces of an input, `uRecords` in all as far as the files divide
@@ -285,8 +264,7 @@ settings read_options(int argc, char** argv) {
         {nullptr, 0, nullptr, 0},
     };
     settings options;
-    const char* const pTemp = getenv("TMPDIR");
-    options.temp = pTemp != nullptr && *pTemp != '\0' ? pTemp : "/tmp";
+    options.temp = temp_parent();
     for (int code; (code = getopt_long(argc, argv, "", OPTIONS, nullptr)) != -1;) {
         const bool bGood =
             read_option(static_cast<char>(code), optarg != nullptr ? optarg : "", &options);

@@ -1,0 +1,89 @@
+// The walk round a ring in memory, alone and with the copies of the records.
+#include "records.h"
+
+#include "element_memory.h"
+#include "first_record.h"
+#include "record_copy.h"
+#include "walk.h"
+
+#include <benchmark/benchmark.h>
+
+#include <cstring>
+#include <vector>
+
+namespace {
+
+constexpr size_t RECORDS = 16'384; // 1 MiB
+
+/// A full ring whose oldest record stands at the start of the area.
+struct memory_ring {
+    memory_ring() : bytes(sizeof(trace_file_header) + RECORDS * sizeof(numbers_record)) {
+        trace_file_header header{};
+        header.uProperties = TRC_PROP_LITTLE_ENDIAN | TRC_PROP_ADDR_64;
+        header.uOffset = sizeof header;
+        header.uActualFileSize = static_cast<uint32_t>(bytes.size());
+        header.uOldestRecordOffset = sizeof header;
+        header.uSeqLock = TRC_SEQ_NO_READER;
+        std::memcpy(bytes.data(), &header, sizeof header);
+        for (uint32_t i = 0; i < RECORDS; ++i) {
+            const numbers_record record = make_record(i * RECORD_STEP_NS, i);
+            std::memcpy(&bytes[sizeof header + i * sizeof record], &record, sizeof record);
+        }
+        file.pName = name;
+        file.pHeader = reinterpret_cast<trace_file_header*>(bytes.data());
+        file.pWrap = reinterpret_cast<trace_record_header*>(bytes.data() + sizeof header);
+        file.pMapEnd = reinterpret_cast<trace_record_header*>(bytes.data() + bytes.size());
+        file.uSize = static_cast<uint32_t>(bytes.size());
+    }
+
+    std::vector<std::byte> bytes;
+    char name[9] = "ring.trc";
+    trace_file file{};
+};
+
+/// Goes once round the ring as a reader does; false when it does not find all.
+template <class function> bool go_round(trace_file* pFile, const function& use_record) {
+    trace_record_header header;
+    size_t uRecords = 0;
+    if (find_first_record(pFile) != 0)
+        return false;
+    walk_result here = is_last_record(pFile, &header);
+    while (here == WALK_RECORD) {
+        use_record(header);
+        ++uRecords;
+        here = step_and_judge(pFile, &header);
+    }
+    return here == WALK_NO_RECORD && uRecords == RECORDS;
+}
+
+void walk(benchmark::State& state) {
+    memory_ring ring;
+    for (auto _ : state) {
+        if (!go_round(&ring.file, [](const trace_record_header& header) {
+                benchmark::DoNotOptimize(header.timeStamp);
+            }))
+            state.SkipWithError("not all records were found");
+    }
+    state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * RECORDS));
+}
+BENCHMARK(walk);
+
+void walk_and_copy(benchmark::State& state) {
+    memory_ring ring;
+    element_memory memory;
+    std::vector<trace_queue_element*> elements;
+    elements.reserve(RECORDS);
+    for (auto _ : state) {
+        const bool bAll = go_round(&ring.file, [&](const trace_record_header& header) {
+            elements.push_back(copy_record(&ring.file, header, &memory));
+        });
+        if (!bAll)
+            state.SkipWithError("not all records were found");
+        release_elements(elements);
+        elements.clear();
+    }
+    state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * RECORDS));
+}
+BENCHMARK(walk_and_copy);
+
+} // namespace
