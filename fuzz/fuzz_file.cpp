@@ -4,7 +4,8 @@
 // The options of the run stand in header bytes that no reader looks at, zero in
 // usual files, so that an input is a trace file as it is:
 //   188-191  N of the start option
-//   192      bits 0-2: anchor.startOptions; bit 3: one file of several
+//   192      bits 0-2: anchor.startOptions; bit 3: one file of several; bit 4:
+//            the kinds that no reader hands on are written too
 //   193      -o letters that are left out, by bit
 //   194-195  nanoseconds of the start time, in units of 15 microseconds
 #include "fuzz_target.h"
@@ -21,6 +22,7 @@ static hostile_options options_in(trace_bytes file) {
     options.startSeconds = static_cast<int32_t>(header.sp_reuse_tm);
     options.startNanoSeconds = uUnits * 15'000;
     options.bManyFiles = (header.sp_flags & 0x08) != 0;
+    options.bEveryKind = (header.sp_flags & 0x10) != 0;
     options.sLetters.clear();
     for (unsigned int i = 0; const char letter : {'d', 't', 'i', 'c', 'f', 's', 'o'})
         if ((header.padding[0] >> i++ & 1) == 0)

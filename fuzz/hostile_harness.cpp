@@ -146,28 +146,62 @@ void take_record(reading& run, const trace_record_header& header) {
         run.options.onWritten(*pElement);
 }
 
+/// Where a walk stands.
+struct walk_state {
+    trace_record_header* pCurRec;
+    uint32_t uSeqLock;
+    uint64_t uUncountedBytes;
+
+    friend bool operator==(const walk_state&, const walk_state&) = default;
+};
+
+walk_state state_of(const trace_file* pTraceFile) {
+    return {pTraceFile->pCurRec, load_seq_lock(pTraceFile->pHeader), pTraceFile->uUncountedBytes};
+}
+
+/// The step as the reader makes it, held against that by the plain operations.
+walk_result step(trace_file* pTraceFile, trace_record_header* pHeader) {
+    const walk_state before = state_of(pTraceFile);
+    trace_record_header plainHeader;
+    walk_result plain = get_next_record(pTraceFile);
+    if (plain == WALK_RECORD)
+        plain = is_last_record(pTraceFile, &plainHeader);
+    const walk_state behind = state_of(pTraceFile);
+
+    pTraceFile->pCurRec = before.pCurRec;
+    store_seq_lock(pTraceFile->pHeader, before.uSeqLock);
+    pTraceFile->uUncountedBytes = before.uUncountedBytes;
+    const walk_result result = step_and_judge(pTraceFile, pHeader);
+    hostile_check(result == plain && state_of(pTraceFile) == behind,
+                  "both ways of stepping lead to the same place");
+    return result;
+}
+
+bool is_taken(const reading& run, const trace_record_header& header) {
+    return is_for_output(header) ? start_is_reached(run.pTraceFile, header)
+                                 : run.options.bEveryKind && header.function != TRC_FUNC_FILLER;
+}
+
 hostile_end walk(reading& run) {
     trace_file* const pTraceFile = run.pTraceFile;
     // What is left of the first turn, and one more when the oldest position
     // holds a filler whose number happens to be the next one.
     uint64_t uStepsLeft = 2 * (ring_size(pTraceFile) / sizeof(trace_record_header)) + 2;
-    for (;;) {
-        trace_record_header header;
-        const walk_result here = is_last_record(pTraceFile, &header);
-        if (here == WALK_CORRUPT)
-            return hostile_end::CORRUPT;
-        if (here == WALK_NO_RECORD) {
-            trace_record_header again;
-            hostile_check(is_last_record(pTraceFile, &again) == WALK_NO_RECORD,
-                          "a file at rest has no more records when it is asked again");
-            return hostile_end::NO_MORE;
-        }
+    trace_record_header header;
+    walk_result here = is_last_record(pTraceFile, &header);
+    while (here == WALK_RECORD) {
         hostile_check(uStepsLeft-- > 0, "the walk ends");
-        if (is_for_output(header) && start_is_reached(pTraceFile, header))
+        if (is_taken(run, header)) {
+            (void)number_has_come(pTraceFile, &header);
             take_record(run, header);
-        if (step_to_next_record(pTraceFile, header) == WALK_CORRUPT)
-            return hostile_end::CORRUPT;
+        }
+        here = step(pTraceFile, &header);
     }
+    if (here == WALK_CORRUPT)
+        return hostile_end::CORRUPT;
+    hostile_check(is_last_record(pTraceFile, &header) == WALK_NO_RECORD,
+                  "a file at rest has no more records when it is asked again");
+    return hostile_end::NO_MORE;
 }
 
 /// What a reader task does, without the waits of the handshake.

@@ -53,6 +53,7 @@ struct hostile_options {
     uint8_t uForms = FORM_ALL;
     std::string sLetters = "dticfso"; ///< at most 7
     bool bManyFiles = false;          ///< the prefix shows the file's index
+    bool bEveryKind = false; ///< also the kinds that no reader hands on, but that can be written
 
     /// Called with each record once it is written, if set.
     std::function<void(const trace_queue_element&)> onWritten{};

@@ -26,9 +26,9 @@ private:
     std::filesystem::path directory;
 };
 
-/// Sets the start option of a run; see fuzz_file.cpp.
-raw_trace with_start(raw_trace file, uint8_t startOptions, uint32_t uNumber) {
-    file.header.sp_flags = startOptions;
+/// Sets the options of a run; see fuzz_file.cpp.
+raw_trace with_options(raw_trace file, uint8_t uFlags, uint32_t uNumber) {
+    file.header.sp_flags = uFlags;
     file.header.sp_reuse_tm = uNumber;
     return file;
 }
@@ -87,6 +87,7 @@ raw_trace formats_file() {
 void add_files(corpus& files) {
     const raw_trace wrapped = wrapped_ring(1024);
     files.add("all_kinds", full_ring_of(SAMPLE_KINDS).bytes());
+    files.add("every_kind", with_options(full_ring_of(SAMPLE_KINDS), 0x10, 0).bytes());
     files.add("all_kinds_32", of_32_bits(full_ring_of(SAMPLE_KINDS)).bytes());
     for (const uint16_t& kind : SAMPLE_KINDS)
         files.add("kind_" + std::to_string(kind), full_ring_of(std::span(&kind, 1)).bytes());
@@ -94,8 +95,9 @@ void add_files(corpus& files) {
     files.add("formats_32", of_32_bits(formats_file()).bytes());
     files.add("wrapped", wrapped.bytes());
     for (uint8_t startOptions = 1; startOptions <= 5; ++startOptions)
-        files.add("start_" + std::to_string(startOptions),
-                  with_start(wrapped, startOptions, startOptions == 5 ? 1'700'000'000 : 3).bytes());
+        files.add(
+            "start_" + std::to_string(startOptions),
+            with_options(wrapped, startOptions, startOptions == 5 ? 1'700'000'000 : 3).bytes());
     files.add("old", old_file().bytes());
     files.add("unfinished", unfinished_file().bytes());
     files.add("empty", raw_trace(256).bytes());

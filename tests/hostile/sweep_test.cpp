@@ -31,6 +31,8 @@ protected:
         EXPECT_EQ(m_uFailures, 0U) << "the first: " << m_firstFailure;
     }
 
+    hostile_options m_options{.bEveryKind = true};
+
 private:
     size_t m_uFailures = 0;
     std::string m_firstFailure;
@@ -88,13 +90,13 @@ TEST_F(Sweep, EveryByteOfARecordHeaderOfEachKind) {
     for (const uint16_t kind : SAMPLE_KINDS) {
         const uint16_t kinds[] = {kind, TRC_FUNC_STRING};
         std::vector<std::byte> file = full_ring_of(kinds).bytes();
-        const hostile_result sound = read_hostile_file(file);
+        const hostile_result sound = read_hostile_file(file, m_options);
         expect(sound.bAccepted && sound.end == hostile_end::NO_MORE, "sound file");
         for (size_t i = 0; i < HEADER; ++i) {
             const std::byte original = file[AREA + i];
             for (unsigned int uValue = 0; uValue < 256; ++uValue) {
                 file[AREA + i] = static_cast<std::byte>(uValue);
-                const hostile_result result = read_hostile_file(file);
+                const hostile_result result = read_hostile_file(file, m_options);
                 if (does_not_lead_the_walk(i))
                     expect(result.end == sound.end && result.uWritten == sound.uWritten,
                            "kind " + std::to_string(kind) + ", " + at(i, uValue));
@@ -109,13 +111,13 @@ TEST_F(Sweep, EveryByteOfABodyOfEachKind) {
     for (const uint16_t kind : SAMPLE_KINDS) {
         const uint16_t kinds[] = {kind, TRC_FUNC_STRING};
         std::vector<std::byte> file = full_ring_of(kinds).bytes();
-        const hostile_result sound = read_hostile_file(file);
+        const hostile_result sound = read_hostile_file(file, m_options);
         const size_t uEnd = AREA + HEADER + sample_body(kind).size();
         for (size_t i = AREA + HEADER; i < uEnd; ++i) {
             const std::byte original = file[i];
             for (const unsigned int uValue : {0x00, 0x01, 0x1B, 0x7F, 0x80, 0xFF}) {
                 file[i] = static_cast<std::byte>(uValue);
-                const hostile_result result = read_hostile_file(file);
+                const hostile_result result = read_hostile_file(file, m_options);
                 expect(result.end == sound.end && result.uWritten == sound.uWritten,
                        "kind " + std::to_string(kind) + ", " + at(i, uValue));
             }
