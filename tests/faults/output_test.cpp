@@ -1,0 +1,50 @@
+// A standard output that goes away or takes nothing, at every stage of a run.
+#include "faults_support.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+namespace {
+
+constexpr char NO_SPACE[] = ": 2625-163 Error writing standard output,  No space left on device\n";
+
+TEST(Output, MayTakeNothing) {
+    const fault_sample sample;
+    command_setup setup;
+    setup.sStdout = "/dev/full";
+    const command_result result = run_command(sample.arguments({"-i"}), setup);
+    sample.expect_honest(result);
+    EXPECT_EQ(result.status, 1);
+    EXPECT_EQ(count_of(NO_SPACE, result.sErr), 1U) << result.sErr;
+    EXPECT_THAT(result.sErr, testing::HasSubstr("100%|"));
+}
+
+TEST(Output, MayBeClosed) {
+    const fault_sample sample;
+    command_setup setup;
+    setup.bStdoutClosed = true;
+    const command_result result = run_command(sample.arguments(), setup);
+    sample.expect_honest(result);
+    EXPECT_EQ(result.status, 1);
+    EXPECT_EQ(count_of("2625-163", result.sErr), 1U) << result.sErr;
+}
+
+/// The text of this run is some 700 KB, more than a pipe and the stream hold.
+TEST(Output, ReaderMayGoAfterAnyAmount) {
+    const temp_dir dir;
+    const auto files = make_samples(dir.path(), {"-n", "2", "-r", "3000", "-p", "strings"});
+    constexpr size_t AMOUNTS[] = {0, 1, 100, 4096, 65'535, 65'536, 150'000, 300'000};
+    for (const size_t uTaken : AMOUNTS) {
+        SCOPED_TRACE(uTaken);
+        live_command kelvo({"-t", dir.path(), files[0], files[1]});
+        for (size_t uRead = 0; uRead < uTaken;)
+            uRead += kelvo.read_text().size();
+        kelvo.close_output();
+        const command_result result = kelvo.wait();
+        expect_sound_end(result);
+        EXPECT_EQ(result.status, 0);
+        EXPECT_EQ(result.sErr, "");
+    }
+}
+
+} // namespace
