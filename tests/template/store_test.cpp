@@ -1,4 +1,5 @@
 #include "store.h"
+#include "template_file.h"
 
 #include "internal_formats.h"
 #include "preload.h"
@@ -234,6 +235,7 @@ TEST_F(Store, LargeTemplateAnswersLikeItsList) {
     std::mt19937 random(7);
     std::string text;
     std::map<std::pair<uint32_t, int>, std::string> last;
+    std::map<uint32_t, std::string> newest; // of any block id
     for (int i = 0; i < 3000; ++i) {
         const auto trace_id = static_cast<uint32_t>(random() % 700 * 6000000u);
         const int block_id = static_cast<int>(random() % 4) - 1;
@@ -242,6 +244,7 @@ TEST_F(Store, LargeTemplateAnswersLikeItsList) {
             text += ':' + std::to_string(block_id);
         text += " \"" + std::to_string(i) + "\"\n";
         last[{trace_id, block_id}] = std::to_string(i);
+        newest[trace_id] = std::to_string(i);
     }
     dir_.write("ABCD.tpl", text);
     for (uint32_t i = 0; i < 700; ++i) {
@@ -251,6 +254,13 @@ TEST_F(Store, LargeTemplateAnswersLikeItsList) {
                       found == last.end() ? "none" : found->second);
         }
     }
+    for (const auto& [trace_id, sText] : newest) {
+        const format_entry* const pEntry =
+            find_newest_format(anchor.pFirstTemplate, static_cast<int32_t>(trace_id));
+        ASSERT_TRUE(pEntry);
+        ASSERT_EQ(pEntry->pString, sText);
+    }
+    EXPECT_EQ(find_newest_format(anchor.pFirstTemplate, 1), nullptr);
 }
 
 TEST_F(Store, ManyComponentsAreKeptApart) {

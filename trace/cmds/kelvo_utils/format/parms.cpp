@@ -9,6 +9,7 @@
 #include "conversion.h"
 #include "direct.h"
 #include "field.h"
+#include "template_file.h"
 #include "text_run.h"
 
 #include <algorithm>
@@ -129,9 +130,7 @@ void write_resource_handle(text_run& out, trace_bytes bytes) {
 
 /// Writes the string of the entry for the trace id in the same template file.
 void write_format_of_trace_id(text_run& out, const template_file* pFile, int32_t iTraceId) {
-    const format_entry* pEntry = pFile ? pFile->pFormats : nullptr;
-    while (pEntry && pEntry->trace_id != iTraceId)
-        pEntry = pEntry->pNext;
+    const format_entry* const pEntry = pFile ? find_newest_format(pFile, iTraceId) : nullptr;
     if (pEntry)
         out.add(std::string_view(pEntry->pString));
 }

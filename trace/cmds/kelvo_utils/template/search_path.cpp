@@ -97,7 +97,8 @@ file_owner open_template_file(const char* pFileName) {
         return nullptr;
     struct stat status;
     FILE* pFile = nullptr;
-    if (fstat(fd, &status) == 0 && S_ISREG(status.st_mode))
+    if (fstat(fd, &status) == 0 && S_ISREG(status.st_mode) &&
+        status.st_size <= MAX_TEMPLATE_FILE_SIZE)
         pFile = fdopen(fd, "r");
     if (pFile == nullptr)
         close(fd);

@@ -27,21 +27,22 @@ uint64_t index_key(const format_entry& entry) {
     return index_key(static_cast<uint32_t>(entry.trace_id), entry.block_id);
 }
 
-/// Indexes a template that was read. Without memory it stays without an index
-/// and is searched entry by entry.
-void build_format_index(template_file* pTemplate) {
-    size_t uCount = 0;
-    for (const format_entry* pEntry = pTemplate->pFormats; pEntry; pEntry = pEntry->pNext)
-        ++uCount;
-    if (uCount < MIN_INDEXED_FORMATS)
-        return;
+uint64_t trace_id_key(const format_entry& entry) {
+    return static_cast<uint32_t>(entry.trace_id);
+}
+
+/// Orders the entries of a list by key, of equal keys only the newest. Null,
+/// and `*pSize` 0, when memory is exhausted.
+format_index_slot* make_index(const template_file* pTemplate, size_t uCount,
+                              uint64_t (*pKey)(const format_entry&), size_t* pSize) {
     auto* const pIndex =
         static_cast<format_index_slot*>(std::malloc(uCount * sizeof(format_index_slot)));
+    *pSize = 0;
     if (pIndex == nullptr)
-        return;
+        return nullptr;
     format_index_slot* pEnd = pIndex;
     for (format_entry* pEntry = pTemplate->pFormats; pEntry; pEntry = pEntry->pNext)
-        *pEnd++ = {index_key(*pEntry), pEntry};
+        *pEnd++ = {pKey(*pEntry), pEntry};
 
     // The list is newest first, and so are equal keys after a stable sort: the
     // first of them is the one that counts.
@@ -51,8 +52,32 @@ void build_format_index(template_file* pTemplate) {
     pEnd = std::unique(pIndex, pEnd, [](const format_index_slot& a, const format_index_slot& b) {
         return a.uKey == b.uKey;
     });
-    pTemplate->pIndex = pIndex;
-    pTemplate->uIndexSize = static_cast<size_t>(pEnd - pIndex);
+    *pSize = static_cast<size_t>(pEnd - pIndex);
+    return pIndex;
+}
+
+/// Indexes a template that was read. Without memory it stays without an index
+/// and is searched entry by entry.
+void build_format_indexes(template_file* pTemplate) {
+    size_t uCount = 0;
+    for (const format_entry* pEntry = pTemplate->pFormats; pEntry; pEntry = pEntry->pNext)
+        ++uCount;
+    if (uCount < MIN_INDEXED_FORMATS)
+        return;
+    pTemplate->pIndex = make_index(
+        pTemplate, uCount, [](const format_entry& entry) { return index_key(entry); },
+        &pTemplate->uIndexSize);
+    pTemplate->pTraceIdIndex =
+        make_index(pTemplate, uCount, trace_id_key, &pTemplate->uTraceIdIndexSize);
+}
+
+format_entry* find_in_index(const format_index_slot* pIndex, size_t uSize, uint64_t uKey) {
+    const format_index_slot* const pEnd = pIndex + uSize;
+    const format_index_slot* const pSlot =
+        std::lower_bound(pIndex, pEnd, uKey, [](const format_index_slot& slot, uint64_t uWanted) {
+            return slot.uKey < uWanted;
+        });
+    return pSlot != pEnd && pSlot->uKey == uKey ? pSlot->pEntry : nullptr;
 }
 
 } // namespace
@@ -68,19 +93,14 @@ int read_template(template_file* pTemplate, const char* pFileName, FILE* pFile,
                   int* p_insufficient_resources) {
     const int iResult = parse_template_file(pTemplate, pFileName, pFile, p_insufficient_resources);
     if (iResult == 0)
-        build_format_index(pTemplate);
+        build_format_indexes(pTemplate);
     return iResult;
 }
 
 format_entry* find_format(const template_file* pTemplate, uint32_t trace_id, int block_id) {
     const uint64_t uKey = index_key(trace_id, block_id);
-    if (pTemplate->pIndex != nullptr) {
-        const format_index_slot* const pEnd = pTemplate->pIndex + pTemplate->uIndexSize;
-        const format_index_slot* const pSlot = std::lower_bound(
-            static_cast<const format_index_slot*>(pTemplate->pIndex), pEnd, uKey,
-            [](const format_index_slot& slot, uint64_t uWanted) { return slot.uKey < uWanted; });
-        return pSlot != pEnd && pSlot->uKey == uKey ? pSlot->pEntry : nullptr;
-    }
+    if (pTemplate->pIndex != nullptr)
+        return find_in_index(pTemplate->pIndex, pTemplate->uIndexSize, uKey);
     for (format_entry* pEntry = pTemplate->pFormats; pEntry; pEntry = pEntry->pNext) {
         if (index_key(*pEntry) == uKey)
             return pEntry;
@@ -88,10 +108,23 @@ format_entry* find_format(const template_file* pTemplate, uint32_t trace_id, int
     return nullptr;
 }
 
+format_entry* find_newest_format(const template_file* pTemplate, int32_t trace_id) {
+    if (pTemplate->pTraceIdIndex != nullptr)
+        return find_in_index(pTemplate->pTraceIdIndex, pTemplate->uTraceIdIndexSize,
+                             static_cast<uint32_t>(trace_id));
+    format_entry* pEntry = pTemplate->pFormats;
+    while (pEntry && pEntry->trace_id != trace_id)
+        pEntry = pEntry->pNext;
+    return pEntry;
+}
+
 void release_formats(template_file* pTemplate) {
     std::free(pTemplate->pIndex);
     pTemplate->pIndex = nullptr;
     pTemplate->uIndexSize = 0;
+    std::free(pTemplate->pTraceIdIndex);
+    pTemplate->pTraceIdIndex = nullptr;
+    pTemplate->uTraceIdIndexSize = 0;
     while (pTemplate->pFormats != nullptr) {
         format_entry* const pEntry = pTemplate->pFormats;
         pTemplate->pFormats = pEntry->pNext;

@@ -28,5 +28,8 @@ template_owner make_template(const char* compId);
 int read_template(template_file* pTemplate, const char* pFileName, FILE* pFile,
                   int* p_insufficient_resources);
 
+/// The newest entry with this trace id, whatever its block id, or null.
+format_entry* find_newest_format(const template_file* pTemplate, int32_t trace_id);
+
 /// The newest entry with this trace id and block id, or null.
 format_entry* find_format(const template_file* pTemplate, uint32_t trace_id, int block_id);
