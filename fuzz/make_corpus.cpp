@@ -64,6 +64,15 @@ raw_trace unfinished_file() {
     return file;
 }
 
+/// A ring in which nothing counts, so that no number tells where it ends.
+raw_trace fillers_file() {
+    raw_trace file(400);
+    file.add_filler(60);
+    file.add_filler(28);
+    file.add_rest();
+    return file;
+}
+
 /// Nested calls, and the formats that are named by a trace id.
 raw_trace formats_file() {
     std::vector<raw_record> records;
@@ -100,6 +109,7 @@ void add_files(corpus& files) {
             with_options(wrapped, startOptions, startOptions == 5 ? 1'700'000'000 : 3).bytes());
     files.add("old", old_file().bytes());
     files.add("unfinished", unfinished_file().bytes());
+    files.add("only_fillers", fillers_file().bytes());
     files.add("empty", raw_trace(256).bytes());
 }
 
