@@ -179,7 +179,7 @@ void measure_linearity(const settings& options) {
            "%8s %8s %8s %10s %10s %9s %9s\n",
            options.sTarget.c_str(), options.uRepeat, "Mrec", "wall s", "CPU s", "wall ns/rec",
            "CPU ns/rec", "resident", "CPU ratio");
-    for (const uint64_t uThousands : {500, 1000, 2000, 5000, 10'000, 20'000}) {
+    for (const uint64_t uThousands : {500U, 1000U, 2000U, 5000U, 10'000U, 20'000U}) {
         const temp_directory directory(options.temp);
         const uint64_t uRecords =
             make_input(INPUTS[0], uThousands * (options.bQuick ? 10 : 1000), directory.path());

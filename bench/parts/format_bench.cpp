@@ -54,7 +54,7 @@ void frame(benchmark::State& state, const char* pLetters) {
         output_end_rec();
     }
     std::memcpy(anchor.outputOptions, kept, sizeof kept);
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations()));
+    state.SetItemsProcessed(state.iterations());
 }
 BENCHMARK_CAPTURE(frame, default, "tic");
 BENCHMARK_CAPTURE(frame, all_letters, "dticfso");
@@ -68,7 +68,7 @@ void write_packed(benchmark::State& state, const char* pFormat,
     const output_to_nowhere nowhere;
     for (auto _ : state)
         format_data_block(pEntry.get(), data, 1);
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations()));
+    state.SetItemsProcessed(state.iterations());
 }
 
 template <class... T> std::vector<std::byte> packed(const T&... values) {
@@ -115,7 +115,7 @@ void find_and_write_blocks(benchmark::State& state) {
         bld_parm_list_unpacked(pEntry.get(), &run, 4, &list);
         format_parms(pEntry.get(), &list, 1);
     }
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations()));
+    state.SetItemsProcessed(state.iterations());
 }
 BENCHMARK(find_and_write_blocks);
 
@@ -145,7 +145,7 @@ void record(benchmark::State& state, const char* pTemplate) {
             for (numbers_element& element : elements)
                 format_record(element.element());
     }
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * RECORDS));
+    state.SetItemsProcessed(state.iterations() * int64_t{RECORDS});
     anchor.bRaw = 0;
     free_template_info();
     anchor.pTemplatePath = pKept;

@@ -45,7 +45,7 @@ void take_and_push(benchmark::State& state) {
     }
     if (!full.bGood)
         state.SkipWithError("memory ran out");
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations()));
+    state.SetItemsProcessed(state.iterations());
 }
 BENCHMARK(take_and_push)->ArgName("files")->Arg(1)->Arg(8)->Arg(64);
 

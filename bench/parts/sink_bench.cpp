@@ -11,7 +11,7 @@
 namespace {
 
 void count_bytes(benchmark::State& state, size_t uBytes) {
-    state.SetBytesProcessed(static_cast<int64_t>(state.iterations() * uBytes));
+    state.SetBytesProcessed(state.iterations() * static_cast<int64_t>(uBytes));
 }
 
 /// Runs of one line, of as many bytes as the argument says.

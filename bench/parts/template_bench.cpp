@@ -59,7 +59,7 @@ void look_up_entry(benchmark::State& state) {
         uId = (uId + 7919) % uEntries;
         benchmark::DoNotOptimize(find_format(pTemplate.get(), uId + 1, -1));
     }
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations()));
+    state.SetItemsProcessed(state.iterations());
 }
 BENCHMARK(look_up_entry)->ArgName("entries")->Arg(10)->Arg(1000)->Arg(100'000);
 
@@ -93,7 +93,7 @@ void look_up_component(benchmark::State& state) {
         state.SkipWithError("a format was not found");
     free_template_info();
     anchor.pTemplatePath = pKept;
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations()));
+    state.SetItemsProcessed(state.iterations());
 }
 BENCHMARK(look_up_component)->ArgName("components")->Arg(1)->Arg(10)->Arg(500);
 

@@ -64,7 +64,7 @@ void walk(benchmark::State& state) {
             }))
             state.SkipWithError("not all records were found");
     }
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * RECORDS));
+    state.SetItemsProcessed(state.iterations() * int64_t{RECORDS});
 }
 BENCHMARK(walk);
 
@@ -82,7 +82,7 @@ void walk_and_copy(benchmark::State& state) {
         release_elements(elements);
         elements.clear();
     }
-    state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * RECORDS));
+    state.SetItemsProcessed(state.iterations() * int64_t{RECORDS});
 }
 BENCHMARK(walk_and_copy);
 
