@@ -115,7 +115,7 @@ TEST_F(Sweep, EveryByteOfABodyOfEachKind) {
         const size_t uEnd = AREA + HEADER + sample_body(kind).size();
         for (size_t i = AREA + HEADER; i < uEnd; ++i) {
             const std::byte original = file[i];
-            for (const unsigned int uValue : {0x00, 0x01, 0x1B, 0x7F, 0x80, 0xFF}) {
+            for (const unsigned int uValue : {0x00U, 0x01U, 0x1BU, 0x7FU, 0x80U, 0xFFU}) {
                 file[i] = static_cast<std::byte>(uValue);
                 const hostile_result result = read_hostile_file(file, m_options);
                 expect(result.end == sound.end && result.uWritten == sound.uWritten,
