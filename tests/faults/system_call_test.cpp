@@ -3,7 +3,6 @@
 // Skipped where strace is not installed or processes may not be traced.
 #include "faults_support.h"
 
-#include <cstdlib>
 #include <fstream>
 #include <map>
 #include <sstream>
@@ -23,9 +22,8 @@ using testing::HasSubstr;
 command_setup traced_setup() {
     command_setup setup;
     setup.sProgram = KELVO_STRACE;
-    const char* const pOptions = getenv("ASAN_OPTIONS");
-    setup.environment.push_back("ASAN_OPTIONS=" + std::string(pOptions ? pOptions : "") +
-                                ":detect_leaks=0");
+    setup.environment = {sanitizer_option("ASAN_OPTIONS", "detect_leaks=0"),
+                         sanitizer_option("TSAN_OPTIONS", "atexit_sleep_ms=0")};
     return setup;
 }
 
