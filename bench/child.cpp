@@ -5,11 +5,11 @@
 #include <chrono>
 #include <csignal>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <ctime>
 #include <fcntl.h>
 #include <memory>
+#include <stdexcept>
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -80,9 +80,7 @@ size_t read_some(int fd, char* pBuffer, size_t uSize) {
 } // namespace
 
 void give_up(const std::string& sWhy) {
-    fflush(stdout);
-    fprintf(stderr, "kelvo_throughput: %s\n", sWhy.c_str());
-    exit(1);
+    throw std::runtime_error(sWhy);
 }
 
 piped_child::piped_child(const command_words& words) {

@@ -1,5 +1,5 @@
 // Programs that are run and measured. Every failure ends the benchmark with a
-// message: a figure that is not sure is none.
+// message, by an exception that main catches: a figure that is not sure is none.
 #pragma once
 
 #include <cstdint>

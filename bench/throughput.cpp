@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <exception>
 #include <filesystem>
 #include <getopt.h>
 #include <string>
@@ -131,7 +132,7 @@ double median_ratio(const std::vector<run_cost> (&runs)[2], double run_cost::*pF
     return median(ratios);
 }
 
-/// Five runs of each of the two, in turn.
+/// Runs of each of the two, in turn.
 void run_in_turn(const settings& options, const program_pair& programs,
                  const std::string& sDirectory, std::vector<run_cost> (&runs)[2]) {
     for (unsigned u = 0; u < options.uRepeat; ++u)
@@ -176,7 +177,7 @@ void compare(const settings& options, const input& in) {
 
 void measure_linearity(const settings& options) {
     printf("\nOne file of 64-byte records, output to %s, medians of %u:\n\n"
-           "%8s %8s %8s %10s %10s %9s %9s\n",
+           "%8s %8s %8s %11s %10s %9s %9s\n",
            options.sTarget.c_str(), options.uRepeat, "Mrec", "wall s", "CPU s", "wall ns/rec",
            "CPU ns/rec", "resident", "CPU ratio");
     for (const uint64_t uThousands : {500U, 1000U, 2000U, 5000U, 10'000U, 20'000U}) {
@@ -278,9 +279,7 @@ settings read_options(int argc, char** argv) {
     return options;
 }
 
-} // namespace
-
-int main(int argc, char** argv) {
+void run_benchmarks(int argc, char** argv) {
     const settings options = read_options(argc, argv);
     setenv("LC_ALL", "C", 1); // the floor writes times as this locale does
     if (options.bComparisons) {
@@ -295,5 +294,17 @@ int main(int argc, char** argv) {
         const temp_directory directory(options.temp);
         measure_follow(options.kelvo, directory.path(), options.uFollowSeconds);
     }
-    return 0;
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    try {
+        run_benchmarks(argc, argv);
+        return 0;
+    } catch (const std::exception& failure) {
+        fflush(stdout);
+        fprintf(stderr, "kelvo_throughput: %s\n", failure.what());
+        return 1;
+    }
 }
