@@ -8,10 +8,13 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
 #include <csignal>
+#include <cstring>
 #include <filesystem>
 #include <set>
 #include <sstream>
+#include <thread>
 
 namespace {
 
@@ -56,6 +59,22 @@ protected:
         const ring_listing ring = list_ring(read_file(sFile));
         EXPECT_EQ(ring.problem, "") << sFile;
         return ring.records();
+    }
+
+    /// Returns when the records of a live file fill so many bytes. By then the
+    /// program has slept at least once; the thread sanitizer's runtime loses a
+    /// signal that comes while it prepares a thread's first sleep.
+    static void wait_until_written(const std::string& sFile, uint32_t uBytes) {
+        for (int i = 0; i < 60'000; ++i) {
+            trace_file_header header{};
+            const std::vector<std::byte> bytes = read_file(sFile);
+            ASSERT_GE(bytes.size(), sizeof header);
+            memcpy(&header, bytes.data(), sizeof header);
+            if (header.uOldestRecordOffset >= header.uOffset + uBytes)
+                return;
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        }
+        ADD_FAILURE() << "nothing is written into " << sFile;
     }
 
     /// Everything that kelvo prints behind the file headers.
@@ -205,6 +224,7 @@ TEST_F(Sample, LiveRunsEndByCountOrSignal) {
     for (const int signo : {SIGINT, SIGTERM}) {
         live_command live({"--live", "--rate", "1000", "-d", m_dir.file("story")}, sample_setup());
         EXPECT_THAT(live.read_line(), HasSubstr("kelvo -f -t "));
+        wait_until_written(m_dir.file("story/gateway.trc"), 2048);
         live.send_signal(signo);
         const command_result result = live.wait();
         EXPECT_EQ(result.status, 0);
