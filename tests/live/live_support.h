@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <map>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -82,5 +83,6 @@ private:
     size_t m_uAt = 0; ///< what lies before is done with
     uint64_t m_uCount = 0;
     std::map<unsigned int, uint64_t> m_last;
+    std::set<unsigned int> m_lacksNumber; ///< files whose last record has no sequence number
     missing_numbers m_missing;
 };

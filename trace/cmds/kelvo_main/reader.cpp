@@ -30,7 +30,7 @@ constexpr int64_t HELD_BACK_WAIT_NS = 10'000'000; // woken earlier when the room
 constexpr useconds_t FOLLOW_WAIT_US = 100'000;
 constexpr int LOOKS_BEFORE_SLEEPING = 20;
 constexpr useconds_t NUMBER_WAIT_US = 100;
-constexpr int NUMBER_WAITS = 50; // a writer that was killed stores no number any more
+constexpr int NUMBER_WAITS = 500; // a writer that was killed stores no number any more
 
 /// With as many files running, a reader that has come to its end starts the next
 /// one only when its own records are printed. (No record waits for that: one that
