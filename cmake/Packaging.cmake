@@ -1,8 +1,11 @@
 # Debian packages, made by scripts/package: kelvo, the command and its pages,
 # and kelvo-dev, for programs that write trace files.
 
-set(KELVO_PACKAGE_CONTACT "kelvo developers <kelvo@example.org>"
-    CACHE STRING "Maintainer named in packages")
+# The default names nobody, at an address that no mail reaches. Who gives
+# packages to others sets it to a name and address of their own:
+#   scripts/package -DKELVO_PACKAGE_CONTACT='Name <address>'
+set(KELVO_PACKAGE_CONTACT "kelvo developers <kelvo@kelvo.invalid>"
+    CACHE STRING "Maintainer named in packages, as Name <address>")
 
 set(CPACK_GENERATOR DEB)
 set(CPACK_PACKAGE_NAME kelvo)
@@ -29,6 +32,7 @@ template files, and can follow the files while they grow.")
 
 set(CPACK_DEBIAN_DEV_PACKAGE_NAME kelvo-dev)
 set(CPACK_DEBIAN_DEV_PACKAGE_SECTION libdevel)
+set(CPACK_DEBIAN_DEV_PACKAGE_DEPENDS libc6-dev)
 set(CPACK_DEBIAN_DEV_PACKAGE_RECOMMENDS kelvo)
 set(CPACK_DEBIAN_DEV_DESCRIPTION
     "write trace files for kelvo

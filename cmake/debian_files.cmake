@@ -1,5 +1,6 @@
 # Run by CPack between staging and packing: each package gets its copyright and
-# changelog, pages are compressed, static libraries lose their debug information.
+# changelog, pages are compressed, programs and static libraries lose what only
+# debuggers and compilers use.
 
 if(NOT CPACK_GENERATOR STREQUAL DEB)
   return()
@@ -11,7 +12,8 @@ string(TIMESTAMP date "%a, %d %b %Y %H:%M:%S +0000" UTC)
 
 foreach(component ${CPACK_COMPONENTS_ALL})
   string(TOUPPER ${component} upper)
-  set(share ${CPACK_TEMPORARY_DIRECTORY}/${component}${CPACK_PACKAGING_INSTALL_PREFIX}/share)
+  set(prefix ${CPACK_TEMPORARY_DIRECTORY}/${component}${CPACK_PACKAGING_INSTALL_PREFIX})
+  set(share ${prefix}/share)
   set(doc ${share}/doc/${CPACK_DEBIAN_${upper}_PACKAGE_NAME})
 
   # Not by file(INSTALL), which would prepend DESTDIR.
@@ -29,10 +31,16 @@ foreach(component ${CPACK_COMPONENTS_ALL})
   foreach(file ${pages} ${doc}/changelog)
     execute_process(COMMAND ${gzip} -9nf ${file} COMMAND_ERROR_IS_FATAL ANY)
   endforeach()
-  file(GLOB_RECURSE libraries
-       ${CPACK_TEMPORARY_DIRECTORY}/${component}${CPACK_PACKAGING_INSTALL_PREFIX}/lib/*.a)
+  file(GLOB programs ${prefix}/bin/*)
+  foreach(file ${programs})
+    execute_process(COMMAND ${strip} --strip-unneeded --remove-section=.comment
+                            --remove-section=.note ${file}
+                    COMMAND_ERROR_IS_FATAL ANY)
+  endforeach()
+  file(GLOB_RECURSE libraries ${prefix}/lib/*.a)
   foreach(file ${libraries})
-    execute_process(COMMAND ${strip} --strip-debug --enable-deterministic-archives ${file}
+    execute_process(COMMAND ${strip} --strip-debug --remove-section=.comment
+                            --enable-deterministic-archives ${file}
                     COMMAND_ERROR_IS_FATAL ANY)
   endforeach()
 endforeach()
