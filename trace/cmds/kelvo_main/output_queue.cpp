@@ -11,40 +11,64 @@ output_queue TrcOutput_Q;
 
 namespace {
 
+/// Negative when the push `uFirst` came before the push `uSecond`.
+int32_t compare_pushes(uint64_t uFirst, uint64_t uSecond) {
+    return static_cast<int32_t>(static_cast<uint32_t>(uFirst) - static_cast<uint32_t>(uSecond));
+}
+
+bool is_later(const queue_entry& first, const queue_entry& second) {
+    return cmp_queue_entries(first, second) > 0;
+}
+
+bool is_later(const queue_head& first, const queue_head& second) {
+    if (first.time != second.time)
+        return first.time > second.time;
+    return compare_pushes(first.pushSeqn, second.pushSeqn) > 0;
+}
+
 /// Heap order: the earliest entry is on top.
 struct greater_Q_compare {
-    bool operator()(const queue_entry& first, const queue_entry& second) const {
-        return cmp_queue_entries(first, second) > 0;
+    template <class entry> bool operator()(const entry& first, const entry& second) const {
+        return is_later(first, second);
     }
 };
 
-void add_to_heap(queue_entries& heap, const queue_entry& entry) {
-    heap.pEntries[heap.uSize++] = entry;
+template <class entry> void order_heap(queue_array<entry>& heap) {
+    std::make_heap(heap.pEntries, heap.pEntries + heap.uSize, greater_Q_compare{});
+}
+
+template <class entry> void add_to_heap(queue_array<entry>& heap, const entry& added) {
+    heap.pEntries[heap.uSize++] = added;
     std::push_heap(heap.pEntries, heap.pEntries + heap.uSize, greater_Q_compare{});
 }
 
-queue_entry take_from_heap(queue_entries& heap) {
+template <class entry> entry take_from_heap(queue_array<entry>& heap) {
     std::pop_heap(heap.pEntries, heap.pEntries + heap.uSize, greater_Q_compare{});
     return heap.pEntries[--heap.uSize];
 }
 
-/// Puts `entry` in the place of the heap's top and restores the order: one way
+/// Puts `added` in the place of the heap's top and restores the order: one way
 /// down instead of a removal and an insertion.
-void replace_top(queue_entries& heap, const queue_entry& entry) {
+template <class entry> void replace_top(queue_array<entry>& heap, const entry& added) {
     size_t uHole = 0;
     for (;;) {
         size_t uChild = 2 * uHole + 1;
         if (uChild >= heap.uSize)
             break;
-        if (uChild + 1 < heap.uSize &&
-            cmp_queue_entries(heap.pEntries[uChild + 1], heap.pEntries[uChild]) < 0)
+        if (uChild + 1 < heap.uSize && is_later(heap.pEntries[uChild], heap.pEntries[uChild + 1]))
             ++uChild;
-        if (cmp_queue_entries(entry, heap.pEntries[uChild]) <= 0)
+        if (!is_later(added, heap.pEntries[uChild]))
             break;
         heap.pEntries[uHole] = heap.pEntries[uChild];
         uHole = uChild;
     }
-    heap.pEntries[uHole] = entry;
+    heap.pEntries[uHole] = added;
+}
+
+/// The head of a run that is not empty.
+queue_head head_of(file_run* pRun) {
+    const queue_entry& entry = pRun->ring.at(0);
+    return {queue_entry_time(entry), entry.pushSeqn, pRun};
 }
 
 int compare(cu_nanoseconds first, cu_nanoseconds second) {
@@ -82,15 +106,14 @@ int cmp_queue_entries(const queue_entry& first, const queue_entry& second) {
         iResult = compare(queue_entry_time(first), queue_entry_time(second));
     if (iResult != 0)
         return iResult;
-    return static_cast<int32_t>(static_cast<uint32_t>(first.pushSeqn) -
-                                static_cast<uint32_t>(second.pushSeqn));
+    return compare_pushes(first.pushSeqn, second.pushSeqn);
 }
 
-bool queue_entries::reserve_one() {
+template <class entry> bool queue_array<entry>::reserve_one() {
     if (uSize < uCapacity)
         return true;
     const size_t uNewCapacity = uCapacity == 0 ? 64 : 2 * uCapacity;
-    auto* pNew = static_cast<queue_entry*>(malloc(uNewCapacity * sizeof(queue_entry)));
+    auto* pNew = static_cast<entry*>(malloc(uNewCapacity * sizeof(entry)));
     if (pNew == nullptr)
         return false;
     for (size_t uIndex = 0; uIndex < uSize; ++uIndex)
@@ -102,9 +125,9 @@ bool queue_entries::reserve_one() {
     return true;
 }
 
-void queue_entries::release() {
+template <class entry> void queue_array<entry>::release() {
     free(pEntries);
-    *this = queue_entries{};
+    *this = queue_array{};
 }
 
 bool output_queue::push(trace_queue_element* pElement) {
@@ -116,9 +139,9 @@ bool output_queue::push(trace_queue_element* pElement) {
         m_pRuns = pRun;
         pFile->pQueuedRun = pRun;
     }
-    queue_entries& ring = pFile->pQueuedRun->ring;
+    queue_array<queue_entry>& ring = pFile->pQueuedRun->ring;
     const queue_entry entry = make_queue_entry(pElement);
-    if (ring.uSize != 0 && cmp_queue_entries(entry, ring.at(ring.uSize - 1)) < 0) {
+    if (ring.uSize != 0 && is_later(ring.at(ring.uSize - 1), entry)) {
         if (!m_late.reserve_one())
             return false;
         add_to_heap(m_late, entry);
@@ -128,7 +151,7 @@ bool output_queue::push(trace_queue_element* pElement) {
         return false;
     ring.at(ring.uSize++) = entry;
     if (ring.uSize == 1)
-        add_to_heap(m_heads, entry);
+        add_to_heap(m_heads, head_of(pFile->pQueuedRun));
     return true;
 }
 
@@ -136,22 +159,26 @@ queue_entry output_queue::pop() {
     if (empty())
         return {};
     if (m_late.uSize != 0 &&
-        (m_heads.uSize == 0 || cmp_queue_entries(m_late.pEntries[0], m_heads.pEntries[0]) < 0))
+        (m_heads.uSize == 0 || is_later(m_heads.pEntries[0].pRun->ring.at(0), m_late.pEntries[0])))
         return take_from_heap(m_late);
 
-    const queue_entry earliest = m_heads.pEntries[0];
-    queue_entries& ring = earliest.pFile->pQueuedRun->ring;
+    file_run* const pRun = m_heads.pEntries[0].pRun;
+    queue_array<queue_entry>& ring = pRun->ring;
+    const queue_entry earliest = ring.at(0);
     ring.uFirst = (ring.uFirst + 1) & (ring.uCapacity - 1);
+    __builtin_prefetch(&ring.at(1)); // the next head but one: pushed on another processor
     if (--ring.uSize != 0)
-        replace_top(m_heads, ring.at(0));
+        replace_top(m_heads, head_of(pRun));
     else
         take_from_heap(m_heads);
     return earliest;
 }
 
 void output_queue::time_base_changed() {
-    std::make_heap(m_heads.pEntries, m_heads.pEntries + m_heads.uSize, greater_Q_compare{});
-    std::make_heap(m_late.pEntries, m_late.pEntries + m_late.uSize, greater_Q_compare{});
+    for (size_t uIndex = 0; uIndex < m_heads.uSize; ++uIndex)
+        m_heads.pEntries[uIndex] = head_of(m_heads.pEntries[uIndex].pRun);
+    order_heap(m_heads);
+    order_heap(m_late);
 }
 
 void output_queue::release() {

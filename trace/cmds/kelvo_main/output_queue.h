@@ -7,10 +7,11 @@
 // the queue is thus the earlier of the two heaps' tops, whatever the files hold,
 // and the usual push and pop look at no more than a few entries.
 //
-// Entries hold what is compared, so that ordering never touches the records.
-// Times are not cached: they follow from the raw stamp and the time base in
-// force. When a file's time base changes, time_base_changed puts both heaps in
-// order again (a run stays in order: all of it moves by the same amount).
+// Entries hold what is compared, so that ordering never touches the records. The
+// time of an entry follows from its raw stamp and the time base in force; only
+// the heads of the runs keep it worked out. When a file's time base changes,
+// time_base_changed works it out anew and puts both heaps in order again (a run
+// stays in order: all of it moves by the same amount).
 //
 // Everything here is called with priorityQmutex held.
 #pragma once
@@ -47,9 +48,18 @@ int cmp_queue_entries(const queue_entry& first, const queue_entry& second);
 /// Time of a record under the time bases in force, nanoseconds since the epoch.
 cu_nanoseconds queue_entry_time(const queue_entry& entry);
 
-/// A growable array of entries, used as a ring or as a heap.
-struct queue_entries {
-    queue_entry* pEntries = nullptr;
+struct file_run;
+
+/// The head of a run, by the time that it has under the base in force.
+struct queue_head {
+    cu_nanoseconds time;
+    uint64_t pushSeqn;
+    file_run* pRun;
+};
+
+/// A growable array, used as a ring or as a heap.
+template <class entry> struct queue_array {
+    entry* pEntries = nullptr;
     size_t uCapacity = 0; ///< a power of two, or 0
     size_t uFirst = 0;    ///< of a ring: index of its head
     size_t uSize = 0;
@@ -57,7 +67,7 @@ struct queue_entries {
     /// Makes room for one more entry. Returns false when memory ran out.
     bool reserve_one();
     /// Of a ring: the entry at `uIndex` counted from the head.
-    queue_entry& at(size_t uIndex) {
+    entry& at(size_t uIndex) {
         return pEntries[(uFirst + uIndex) & (uCapacity - 1)];
     }
     void release();
@@ -67,7 +77,7 @@ struct queue_entries {
 struct file_run {
     file_run* pNext;
     trace_file* pFile;
-    queue_entries ring;
+    queue_array<queue_entry> ring;
 };
 
 /// The queue; TrcOutput_Q is the only instance outside tests.
@@ -92,8 +102,8 @@ public:
     void release();
 
 private:
-    queue_entries m_heads; ///< heap: the first entry of every run that is not empty
-    queue_entries m_late;  ///< heap: latecomers
+    queue_array<queue_head> m_heads; ///< heap: the head of every run that is not empty
+    queue_array<queue_entry> m_late; ///< heap: latecomers
     file_run* m_pRuns = nullptr;
 };
 
