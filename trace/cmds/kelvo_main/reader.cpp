@@ -218,9 +218,17 @@ void end_reading(trace_file* pTraceFile) {
 }
 
 /// Whether the reader of the list element must run before the record is pushed.
-bool its_time_has_come(const TrcPreProcHdrElem& candidate, const trace_queue_element* pElement) {
-    return pElement == nullptr || pElement->header.timeStamp >= candidate.header.timeStamp ||
-           queue_entry_time(make_queue_entry(pElement)) >= candidate.earliestFrom;
+bool its_time_has_come(const TrcPreProcHdrElem& candidate, const trace_queue_element& element) {
+    return element.header.timeStamp >= candidate.header.timeStamp ||
+           queue_entry_time(make_queue_entry(&element)) >= candidate.earliestFrom;
+}
+
+/// Whether only files that could not be started lie between the list elements
+/// `next` and `candidate`.
+bool is_successor(uint32_t candidate, uint32_t next) {
+    while (next < candidate && ctrl.pTrcPreProcHdrList[next].pTrcFile->bErrorProcessing)
+        ++next;
+    return next == candidate;
 }
 
 } // namespace
@@ -249,21 +257,19 @@ void TrcFileProcessingCtrl(const trace_queue_element* pElement, uint32_t next) {
     if (anchor.bFollow)
         return;
     const uint32_t uFiles = static_cast<uint32_t>(anchor.iNumberFiles);
-    while (next < uFiles && ctrl.uNextUnOpenFileIdx < uFiles) {
-        TrcPreProcHdrElem& candidate = ctrl.pTrcPreProcHdrList[next];
-        if (candidate.isOpenned)
-            return;
-        if (candidate.pTrcFile->bErrorProcessing) {
-            ++next;
-            continue;
-        }
-        if (!its_time_has_come(candidate, pElement))
+    // Files start in the order of the list. A record may start any number of
+    // them: those that begin at about the same time make their handshakes side
+    // by side. A reader that has come to its end starts its successor only.
+    while (ctrl.uNextUnOpenFileIdx < uFiles) {
+        TrcPreProcHdrElem& candidate = ctrl.pTrcPreProcHdrList[ctrl.uNextUnOpenFileIdx];
+        if (pElement != nullptr ? !its_time_has_come(candidate, *pElement)
+                                : !is_successor(ctrl.uNextUnOpenFileIdx, next))
             return;
         candidate.isOpenned = 1;
         const bool bStarted = start_tracefile_processing(candidate.pTrcFile) == 0;
         ++ctrl.uNextUnOpenFileIdx;
         if (bStarted)
-            return;
+            continue;
         candidate.isOpenned = 0;
         candidate.pTrcFile->bErrorProcessing = 1;
         ++ctrl.uFinishedFiles;

@@ -12,12 +12,12 @@
 // - behind a record that changes the file's time base, until that record is
 //   formatted: what follows is compared under the new base only.
 //
-// Outside follow mode the readers are started one at a time, in the order of
-// the pre-processing list, each by its predecessor: before it pushes a record
-// that is not earlier than the first record of the next file's area (raw), or
-// not earlier than the oldest record of any file not yet started (converted),
-// and at its own end at the latest. So a file is mapped only while the merge
-// has reached its time range, and no record is printed before an earlier one.
+// Outside follow mode the readers are started in the order of the pre-processing
+// list: before one that runs pushes a record that is not earlier than the first
+// record of the next file's area (raw), or not earlier than the oldest record of
+// any file not yet started (converted), and at the end of the predecessor at the
+// latest. So a file is mapped only while the merge has reached its time range,
+// and no record is printed before an earlier one.
 #pragma once
 
 #include "kelvo.h"
@@ -32,9 +32,10 @@ inline constexpr uint32_t ALWAYS_QUEUED = 4;
 /// Called with priorityQmutex held.
 int start_tracefile_processing(trace_file* pTraceFile);
 
-/// Starts the reader of the next file in time order if its time has come:
-/// looking from list index `next` on, when `pElement` (the record about to be
-/// pushed; null: any) is not earlier. Called with priorityQmutex held.
+/// Starts the readers of the next files in the order of the list. With an
+/// element, the record about to be pushed, all those whose time has come; with
+/// null only the list element `next`, or the one behind it that can be started,
+/// when it was not started yet. Called with priorityQmutex held.
 void TrcFileProcessingCtrl(const trace_queue_element* pElement, uint32_t next);
 
 /// The reader task; `pTask` is the trace_file. Returns null.
