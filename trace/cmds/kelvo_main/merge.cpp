@@ -34,7 +34,9 @@ constexpr size_t MAX_TAKEN = 256;
 struct taken_records {
     std::array<trace_queue_element*, MAX_TAKEN> pElements;
     size_t uCount = 0;
-    uint32_t uDepthBehind = 0; ///< queue depth after the last one was taken
+    uint32_t uDepthBehind = 0;                  ///< queue depth after the last one was taken
+    std::array<trace_file*, MAX_TAKEN> pToWake; ///< files whose readers have room again
+    size_t uToWake = 0;
     std::span<trace_queue_element*> all() {
         return {pElements.data(), uCount};
     }
@@ -52,7 +54,7 @@ bool is_waited_for(const trace_file* pTraceFile) {
     return pTraceFile->bRunning != 0 && pTraceFile->numRecPushed == 0;
 }
 
-queue_entry take_record() {
+queue_entry take_record(taken_records& taken) {
     const queue_entry entry = TrcOutput_Q.pop();
     trace_file* const pFile = entry.pFile;
     --ctrl.queueDepth;
@@ -60,8 +62,10 @@ queue_entry take_record() {
     --pFile->numRecPushed;
     if (is_waited_for(pFile))
         ++ctrl.uFilesWithNothingQueued;
-    if (pFile->bWaitsForRoom && pFile->numRecPushed <= pFile->uRoomAt)
-        pthread_cond_signal(&pFile->roomCond);
+    if (pFile->bWaitsForRoom && pFile->numRecPushed <= pFile->uRoomAt) {
+        pFile->bWaitsForRoom = 0;
+        taken.pToWake[taken.uToWake++] = pFile;
+    }
     return entry;
 }
 
@@ -70,13 +74,21 @@ queue_entry take_record() {
 void take_records(taken_records& taken) {
     const mutex_guard guard(ctrl.priorityQmutex);
     taken.uCount = 0;
+    taken.uToWake = 0;
     while (taken.uCount < MAX_TAKEN && a_record_may_be_taken()) {
-        const queue_entry entry = take_record();
+        const queue_entry entry = take_record(taken);
         taken.pElements[taken.uCount++] = entry.pElement;
         if (entry.bChangesBase)
             break;
     }
     taken.uDepthBehind = ctrl.queueDepth;
+}
+
+/// Wakes the readers that have room again; not under the lock, for which each of
+/// them would have to wait at once.
+void wake_readers(const taken_records& taken) {
+    for (size_t uIndex = 0; uIndex < taken.uToWake; ++uIndex)
+        pthread_cond_signal(&taken.pToWake[uIndex]->roomCond);
 }
 
 /// Has the processor fetch a record that will soon be formatted: it was written
@@ -213,6 +225,7 @@ void file_stops_running(trace_file* pTraceFile) {
 bool find_and_format_next_record() {
     static taken_records taken; // main thread only
     take_records(taken);
+    wake_readers(taken);
     if (taken.uCount == 0) {
         if (!any_file_is_running())
             return false;
