@@ -5,7 +5,7 @@
 #include "hostile_harness.h"
 
 #include "compile.h"
-#include "parms.h"
+#include "format_text.h"
 #include "record_view.h"
 #include "template_file.h"
 

@@ -4,7 +4,7 @@
 #include "../temp_directory.h"
 #include "compile.h"
 #include "frame.h"
-#include "parms.h"
+#include "format_text.h"
 #include "record.h"
 #include "record_view.h"
 #include "store.h"

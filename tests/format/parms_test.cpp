@@ -1,7 +1,7 @@
 // Parameters of formats: where they are found, what they print, and that every
 // number and string prints as printf would print it.
 
-#include "parms.h"
+#include "format_text.h"
 
 #include "compile.h"
 #include "raw_trace.h"

@@ -51,13 +51,16 @@ enum : parm_type_t {
 /// Most parameters, and most conversions, of one format string.
 inline constexpr int MAX_PARMS = 128;
 
+/// Stands for the index of a parameter where there is none.
+inline constexpr uint8_t NO_PARM = 255;
+
 /// One conversion of a compiled format string.
 struct conv_spec {
     uint8_t parmNum;      ///< index of the parameter that is printed
     uint8_t widthOffset;  ///< characters from '%' to the '*' width; 0: none
-    uint8_t widthParmNum; ///< index of the parameter with the '*' width; 255: none
+    uint8_t widthParmNum; ///< index of the parameter with the '*' width, or NO_PARM
     uint8_t precOffset;   ///< characters from '%' to the '*' precision; 0: none
-    uint8_t precParmNum;  ///< index of the parameter with the '*' precision; 255: none
+    uint8_t precParmNum;  ///< index of the parameter with the '*' precision, or NO_PARM
     uint8_t lenConv;      ///< characters from '%' through the conversion letter
     uint16_t offset;      ///< position of the '%' in pString
 };
@@ -65,10 +68,13 @@ struct conv_spec {
 /// Bits of format_entry::properties.
 enum : int32_t { FORMAT_NUMBERED_PARMS = 1 };
 
+/// Readable bytes from the begin of a format's literal text on.
+inline constexpr size_t PADDED_TEXT = 16;
+
 /// Literal text of a format string as it is written, "%%" as one percent sign,
 /// and how the conversion behind it is written.
 struct format_piece {
-    const char* pText;
+    const char* pText; ///< PADDED_TEXT bytes can be read there, however short it is
     uint32_t uLength;
     uint8_t uDirect; ///< a direct_writer; found out when the conversion is first written
     uint8_t uWidth;  ///< of a number that is written directly
@@ -103,6 +109,7 @@ struct format_entry {
     // Not part of the format of the record, but kept beside it:
     format_piece* pPieces; ///< numConvs + 1: before each conversion, and after the last one
                            ///< (there without a newline at the very end)
+    bool bParmsInOrder;    ///< the conversions use the parameters in order, each once, without '*'
 };
 
 /// The formats of one component.

@@ -2,8 +2,8 @@
 // its parameters from the leading blocks, one each; every further block has a
 // format of its own, named by its position, or is dumped.
 
+#include "format_text.h"
 #include "hex.h"
-#include "parms.h"
 #include "record_bodies.h"
 #include "record_text.h"
 #include "store.h"
@@ -32,7 +32,7 @@ static uint32_t write_leading_blocks(const record_view& record, const format_ent
         format_parms(pFormat, nullptr, record.pFile->addrMode64);
         return 0;
     }
-    static constinit parm_list parms{}; // static: see format_data_block
+    static constinit parm_list parms{}; // static: see format_packed_parms
     bld_parm_list_unpacked(pFormat, pBlocks, uBlocks, &parms);
     format_parms(pFormat, &parms, record.pFile->addrMode64);
     return static_cast<uint32_t>(parms.numParms);

@@ -6,8 +6,8 @@
 // has none runs to the record's end, so one NUL put behind the record ends all
 // of them; the queue element leaves room for it.
 
+#include "format_text.h"
 #include "insufficient.h"
-#include "parms.h"
 #include "record_bodies.h"
 #include "record_text.h"
 
@@ -142,7 +142,7 @@ parm_ref int_parm(trace_bytes bytes, size_t uOffset) {
 
 void write_by_format(const format_entry* pFormatEntry, const record_view& record,
                      const error_texts& texts, const char* pMessage) {
-    static constinit parm_list parms{}; // static: see format_data_block
+    static constinit parm_list parms{}; // static: see format_packed_parms
     parms.pParms[0] = int_parm(record.bytes, offsetof(trace_record_error, errorId));
     parms.pParms[1] = string_parm(texts.pFunction);
     parms.pParms[2] = int_parm(record.bytes, offsetof(trace_record_error, lineNumber));

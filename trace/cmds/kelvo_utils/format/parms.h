@@ -1,5 +1,5 @@
-// Parameters of a format: where they lie in the bytes of a record, and the text
-// they give. Main thread only; nothing is allocated.
+// Parameters of a format: where they lie in the bytes of a record. Main thread
+// only; nothing is allocated.
 #pragma once
 
 #include "kelvo.h"
@@ -11,6 +11,11 @@ struct parm_ref {
     trace_bytes bytes;     ///< from the parameter's first byte to the end of what may be read
     uint32_t uStringLimit; ///< a string ends here at the latest, bytes; at its NUL before
 };
+
+/// The base of a type code, without PARM_UNSIGNED.
+constexpr parm_type_t base_type(parm_type_t type) {
+    return type & PARM_BASE_MASK;
+}
 
 /// Parameters of one format, found in a record.
 struct parm_list {
@@ -36,7 +41,3 @@ void bld_parm_list_packed(const format_entry* pFormatEntry, trace_bytes* pRun, i
 /// uses anew.
 void bld_parm_list_unpacked(const format_entry* pFormatEntry, trace_bytes* pBlocks,
                             uint32_t numBlocks, parm_list* pList);
-
-/// Writes the format's text with its parameters, ending with a newline.
-/// `pList` may be null when there are none.
-void format_parms(const format_entry* pFormatEntry, const parm_list* pList, int bAddr64);

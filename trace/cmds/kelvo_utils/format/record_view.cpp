@@ -1,8 +1,9 @@
 #include "record_view.h"
 
+#include "format_text.h"
 #include "hex.h"
 #include "mutex.h"
-#include "parms.h"
+
 #include "store.h"
 
 #include <algorithm>
@@ -35,11 +36,7 @@ const format_entry* find_record_format(const record_view& record, uint32_t uTrac
 }
 
 void format_data_block(const format_entry* pFormatEntry, trace_bytes data, int bAddr64) {
-    // Static, because setting up room for MAX_PARMS parameters anew would cost
-    // more than most records need for the rest.
-    static constinit parm_list parms{};
-    bld_parm_list_packed(pFormatEntry, &data, bAddr64, &parms);
-    format_parms(pFormatEntry, &parms, bAddr64);
+    format_packed_parms(pFormatEntry, &data, bAddr64);
     if (!data.empty())
         format_hex(data);
 }

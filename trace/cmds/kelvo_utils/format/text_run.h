@@ -2,6 +2,7 @@
 // single characters. Main thread only.
 #pragma once
 
+#include "kelvo.h"
 #include "sink.h"
 
 #include <algorithm>
@@ -35,6 +36,17 @@ public:
         }
         if (!piece.empty())
             std::memcpy(text + uLength, piece.data(), piece.size());
+        uLength += piece.size();
+    }
+
+    /// Adds a piece of a format, behind whose first byte PADDED_TEXT bytes can be
+    /// read whatever its length is. Most are shorter and are copied in one go.
+    void add_padded(std::string_view piece) {
+        if (piece.size() > PADDED_TEXT || PADDED_TEXT > sizeof(text) - uLength) [[unlikely]] {
+            add(piece);
+            return;
+        }
+        std::memcpy(text + uLength, piece.data(), PADDED_TEXT);
         uLength += piece.size();
     }
 

@@ -23,7 +23,6 @@
 
 namespace {
 
-constexpr uint8_t NO_PARM = 255;
 constexpr int MAX_NUMBER_DIGITS = 15;
 constexpr std::string_view FLAG_CHARACTERS = "'-+ #0BNJ";
 
@@ -268,6 +267,15 @@ void lay_out_pieces(format_entry& entry, char* pText) {
     }
 }
 
+bool uses_parms_in_order(const format_entry& entry) {
+    for (int i = 0; i < entry.numConvs; ++i) {
+        const conv_spec& place = entry.pConvSpecs[i];
+        if (place.parmNum != i || place.widthParmNum != NO_PARM || place.precParmNum != NO_PARM)
+            return false;
+    }
+    return entry.numConvs == entry.numParms;
+}
+
 constexpr size_t round_up(size_t uValue, size_t uMultiple) {
     return (uValue + uMultiple - 1) / uMultiple * uMultiple;
 }
@@ -286,7 +294,7 @@ format_entry* make_entry(const format_scan& scan) {
     const size_t uPiecesAt = round_up(uStringAt + uStringSize, alignof(format_piece));
     const size_t uTextAt = uPiecesAt + (uConvs + 1) * sizeof(format_piece);
 
-    auto* const pBlock = static_cast<std::byte*>(std::malloc(uTextAt + uStringSize));
+    auto* const pBlock = static_cast<std::byte*>(std::malloc(uTextAt + uStringSize + PADDED_TEXT));
     if (pBlock == nullptr)
         return nullptr;
     auto* const pEntry = new (pBlock) format_entry{};
@@ -302,6 +310,8 @@ format_entry* make_entry(const format_scan& scan) {
     std::memcpy(pEntry->pString, scan.pString, uStringSize);
     pEntry->pPieces = reinterpret_cast<format_piece*>(pBlock + uPiecesAt);
     lay_out_pieces(*pEntry, reinterpret_cast<char*>(pBlock + uTextAt));
+    std::memset(pBlock + uTextAt + uStringSize, 0, PADDED_TEXT);
+    pEntry->bParmsInOrder = uses_parms_in_order(*pEntry);
     return pEntry;
 }
 
