@@ -85,6 +85,7 @@ struct format_piece {
 enum direct_writer : uint8_t {
     DIRECT_UNKNOWN = 0, ///< not yet looked at
     DIRECT_NONE,        ///< goes by its text each time
+    DIRECT_NOTHING,     ///< prints nothing
     DIRECT_SIGNED,
     DIRECT_UNSIGNED,
     DIRECT_HEX,
@@ -130,6 +131,9 @@ struct template_file {
 
 // -------------------------------------------------------------- trace files
 
+/// Bytes that processors fetch and take from one another in one piece.
+inline constexpr size_t CACHE_LINE = 64;
+
 /// Bits of thread_info::outputFlags.
 enum : uint16_t {
     THREAD_BLANK_LINE_AFTER = 0x02, ///< an empty line follows the open record
@@ -155,20 +159,24 @@ struct file_run;
 ///   modTime from the first queued record on until the reader closes the file,
 ///   which it does only when none of its records is queued or being formatted;
 /// - under priorityQmutex: numRecPushed, bRecUnderProcess, bTimeBaseInQueue.
+///
+/// What the reader writes at every record, what the main thread writes at every
+/// record, and what both only read lie in cache lines apart.
 struct trace_file {
     trace_file* pNext;            ///< next file of anchor.pFirstFile
     char* pName;                  ///< path as given; lies in the same block
     trace_file_header* pHeader;   ///< start of the mapping, or the private copy while parked
     trace_record_header* pMapEnd; ///< end of the mapping; null when not mapped
     trace_record_header* pWrap;   ///< start of the record area; null when not mapped
-    trace_record_header* pCurRec; ///< where the reader stands
-    int fd;                       ///< -1 when closed
-    uint32_t uSize;               ///< bytes mapped
-    int index;                    ///< position among the file arguments, from 0
-    cu_timeinfo timeInfo;         ///< time base in force
-    int addrMode64;               ///< the writer ran in 64-bit mode
-    int recordNumber;             ///< records counted while the start is sought
-    int startOptions;             ///< FILE_START_*
+    alignas(CACHE_LINE) trace_record_header* pCurRec; ///< where the reader stands
+    uint64_t uUncountedBytes;   ///< bytes walked since a record last counted in the sequence
+    alignas(CACHE_LINE) int fd; ///< -1 when closed
+    uint32_t uSize;             ///< bytes mapped
+    int index;                  ///< position among the file arguments, from 0
+    cu_timeinfo timeInfo;       ///< time base in force
+    int addrMode64;             ///< the writer ran in 64-bit mode
+    int recordNumber;           ///< records counted while the start is sought
+    int startOptions;           ///< FILE_START_*
     int32_t startSeconds;
     int32_t startNanoSeconds;
     int32_t startRecords;
@@ -178,27 +186,27 @@ struct trace_file {
     uint32_t queueSize;
     int bOverflow; ///< while set, records are not queued
     pthread_mutex_t queueMutex;
-    std::atomic<pthread_t> threadId; ///< pool thread that runs the reader; 0: none
-    timespec modTime;                ///< latest record time seen
-    int timeStampIsValid;            ///< modTime holds a time
+    std::atomic<pthread_t> threadId;      ///< pool thread that runs the reader; 0: none
+    alignas(CACHE_LINE) timespec modTime; ///< latest record time seen
+    int timeStampIsValid;                 ///< modTime holds a time
     thread_info* pThreadInfo;
-    uint32_t queueDepth;
+    alignas(CACHE_LINE) uint32_t queueDepth;
     uint32_t numRecPushed;             ///< records now in the output queue
     uint32_t index2;                   ///< position in the sorted pre-processing list
     std::atomic<int> bErrorProcessing; ///< reading could not be started
     int bRecUnderProcess;              ///< records of this file are being formatted
 
     // Not part of the format of the record, but kept beside it:
-    uint8_t uPlatform;        ///< the writer's platform code, taken at open
-    int bAccepted;            ///< the header was validated: the two reader words may be stored
-    size_t uMappedSize;       ///< bytes mapped at pHeader; uSize is its low 32 bits
-    uint64_t uUncountedBytes; ///< bytes walked since a record last counted in the sequence
-    int bTimeBaseInQueue;     ///< a record that changes timeInfo is queued and not yet formatted
-    file_run* pQueuedRun;     ///< this file's records in the output queue; made by the queue
-    pthread_cond_t roomCond;  ///< signalled when the reader may push again
-    int bWaitsForRoom;        ///< the reader waits on roomCond
-    uint32_t uRoomAt;         ///< it is to be woken at this numRecPushed
-    int bRunning;             ///< the reader was started and has not finished
+    alignas(CACHE_LINE) uint8_t uPlatform; ///< the writer's platform code, taken at open
+    int bAccepted;      ///< the header was validated: the two reader words may be stored
+    size_t uMappedSize; ///< bytes mapped at pHeader; uSize is its low 32 bits
+    alignas(CACHE_LINE) int bTimeBaseInQueue; ///< a record that changes timeInfo is queued and not
+                                              ///< yet formatted
+    file_run* pQueuedRun;    ///< this file's records in the output queue; made by the queue
+    pthread_cond_t roomCond; ///< signalled when the reader may push again
+    int bWaitsForRoom;       ///< the reader waits on roomCond
+    uint32_t uRoomAt;        ///< it is to be woken at this numRecPushed
+    int bRunning;            ///< the reader was started and has not finished
 };
 
 /// trace_file::startOptions.

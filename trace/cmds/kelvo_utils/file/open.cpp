@@ -40,8 +40,9 @@ using header_copy_ptr = std::unique_ptr<trace_file_header, block_freer>;
 /// out (reported).
 trace_file_ptr make_trace_file(const char* pName) {
     const size_t uNameSize = strlen(pName) + 1;
-    const size_t uSize = sizeof(trace_file) + uNameSize;
-    void* const pBlock = malloc(uSize);
+    constexpr size_t ALIGNMENT = alignof(trace_file);
+    const size_t uSize = (sizeof(trace_file) + uNameSize + ALIGNMENT - 1) / ALIGNMENT * ALIGNMENT;
+    void* const pBlock = aligned_alloc(ALIGNMENT, uSize);
     if (pBlock == nullptr) {
         warn_insufficient_resources_during_open(pName, static_cast<int64_t>(uSize));
         return nullptr;
