@@ -71,6 +71,17 @@ queue_head head_of(file_run* pRun) {
     return {queue_entry_time(entry), entry.pushSeqn, pRun};
 }
 
+/// In place: a copy of what was just stored by fields would wait for the stores.
+void fill_queue_entry(queue_entry* pEntry, const trace_queue_element* pElement) {
+    const uint16_t uFunction = pElement->header.function;
+    pEntry->uTimeStamp = pElement->header.timeStamp;
+    pEntry->pushSeqn = pElement->pushSeqn & ((uint64_t{1} << 62) - 1);
+    pEntry->bOwnBase = uFunction == TRC_FUNC_START;
+    pEntry->bChangesBase = changes_time_base(uFunction);
+    pEntry->pFile = pElement->pFile;
+    pEntry->pElement = const_cast<trace_queue_element*>(pElement);
+}
+
 int compare(cu_nanoseconds first, cu_nanoseconds second) {
     return first < second ? -1 : first > second ? 1 : 0;
 }
@@ -78,14 +89,8 @@ int compare(cu_nanoseconds first, cu_nanoseconds second) {
 } // namespace
 
 queue_entry make_queue_entry(const trace_queue_element* pElement) {
-    const uint16_t uFunction = pElement->header.function;
-    queue_entry entry{};
-    entry.uTimeStamp = pElement->header.timeStamp;
-    entry.pushSeqn = pElement->pushSeqn & ((uint64_t{1} << 62) - 1);
-    entry.bOwnBase = uFunction == TRC_FUNC_START;
-    entry.bChangesBase = changes_time_base(uFunction);
-    entry.pFile = pElement->pFile;
-    entry.pElement = const_cast<trace_queue_element*>(pElement);
+    queue_entry entry;
+    fill_queue_entry(&entry, pElement);
     return entry;
 }
 
@@ -140,17 +145,17 @@ bool output_queue::push(trace_queue_element* pElement) {
         pFile->pQueuedRun = pRun;
     }
     queue_array<queue_entry>& ring = pFile->pQueuedRun->ring;
-    const queue_entry entry = make_queue_entry(pElement);
+    if (!ring.reserve_one() || (ring.uSize == 0 && !m_heads.reserve_one()))
+        return false;
+    queue_entry& entry = ring.at(ring.uSize);
+    fill_queue_entry(&entry, pElement);
     if (ring.uSize != 0 && is_later(ring.at(ring.uSize - 1), entry)) {
         if (!m_late.reserve_one())
             return false;
         add_to_heap(m_late, entry);
         return true;
     }
-    if (!ring.reserve_one() || (ring.uSize == 0 && !m_heads.reserve_one()))
-        return false;
-    ring.at(ring.uSize++) = entry;
-    if (ring.uSize == 1)
+    if (++ring.uSize == 1)
         add_to_heap(m_heads, head_of(pFile->pQueuedRun));
     return true;
 }

@@ -42,9 +42,10 @@ constexpr uint32_t ENOUGH_RUNNING_FILES = 16;
 /// More files than this at once do not make a file's share of the cap smaller.
 constexpr int64_t MAX_SHARES = 64;
 
-/// Copies of records that are not yet pushed.
+/// Copies of records that are not yet pushed: enough to make the lock cheap, few
+/// enough to be still in the processor's nearest cache when they are pushed.
 struct record_batch {
-    std::array<trace_queue_element*, 256> pElements;
+    std::array<trace_queue_element*, 128> pElements;
     size_t uCount = 0;
     element_memory memory;
 };

@@ -18,9 +18,8 @@
 
 #include "trace_file_fmt.h"
 
-#include <array>
 #include <atomic>
-#include <bit>
+#include <cstddef>
 #include <cstdint>
 #include <cstring>
 
@@ -55,30 +54,28 @@ inline void store_seq_lock(trace_file_header* pHeader, uint32_t uSeqLock) {
 
 // --------------------------------------------------------------- the records
 
-/// A record header as seven words. May alias what the writer stored by field.
-using shared_word [[gnu::may_alias]] = uint32_t;
-using record_header_words = std::array<uint32_t, sizeof(trace_record_header) / sizeof(uint32_t)>;
-static_assert(sizeof(record_header_words) == sizeof(trace_record_header));
+/// The word at `pWord`, read before everything that is read after it. May alias
+/// what the writer stored.
+inline uint32_t load_first(const std::byte* pWord) {
+    using shared_word [[gnu::may_alias]] = uint32_t;
+    if (reinterpret_cast<uintptr_t>(pWord) % alignof(uint32_t) == 0) [[likely]]
+        return __atomic_load_n(reinterpret_cast<const shared_word*>(pWord), __ATOMIC_ACQUIRE);
+    uint32_t uWord; // no atomic access to a word that may cross a cache line
+    memcpy(&uWord, pWord, sizeof uWord);
+    std::atomic_signal_fence(std::memory_order_acquire);
+    return uWord;
+}
 
-/// A copy of the record header at `pRecord`, each word read once and seqNumber
-/// first: if that is the expected one, the others are complete.
+/// A copy of the record header at `pRecord`. Its seqNumber is read before the
+/// rest: if that is the expected one, the others are complete. What is returned
+/// does not change any more, whatever the writer does.
 inline trace_record_header load_record_header(const void* pRecord) {
-    constexpr size_t SEQ = offsetof(trace_record_header, seqNumber) / sizeof(uint32_t);
-    record_header_words words;
-    if (reinterpret_cast<uintptr_t>(pRecord) % alignof(uint32_t) == 0) [[likely]] {
-        const auto* const pWords = static_cast<const shared_word*>(pRecord);
-        words[SEQ] = __atomic_load_n(pWords + SEQ, __ATOMIC_ACQUIRE);
-        for (size_t i = 0; i < words.size(); ++i)
-            if (i != SEQ)
-                words[i] = __atomic_load_n(pWords + i, __ATOMIC_RELAXED);
-    } else { // no atomic access to words that may cross a cache line; the order is kept
-        const auto* const pBytes = static_cast<const std::byte*>(pRecord);
-        constexpr size_t BEFORE = SEQ * sizeof(uint32_t);
-        constexpr size_t BEHIND = BEFORE + sizeof(uint32_t);
-        memcpy(&words[SEQ], pBytes + BEFORE, sizeof(uint32_t));
-        std::atomic_signal_fence(std::memory_order_acquire);
-        memcpy(words.data(), pBytes, BEFORE);
-        memcpy(&words[SEQ + 1], pBytes + BEHIND, sizeof(words) - BEHIND);
-    }
-    return std::bit_cast<trace_record_header>(words);
+    const auto* const pBytes = static_cast<const std::byte*>(pRecord);
+    const uint32_t seqNumber = load_first(pBytes + offsetof(trace_record_header, seqNumber));
+    trace_record_header header;
+    memcpy(&header, pBytes, sizeof header);
+    std::atomic_signal_fence(std::memory_order_seq_cst); // no field is read from the ring again
+    if (header.seqNumber != seqNumber) [[unlikely]]      // stored meanwhile; not always, since a
+        header.seqNumber = seqNumber;                    // store would hold up the next copy
+    return header;
 }
