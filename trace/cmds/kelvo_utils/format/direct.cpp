@@ -49,6 +49,10 @@ direct_writer find_direct_writer(const conversion& conv, parm_type_t type) {
 } // namespace
 
 void choose_direct_writer(format_piece* pPiece, const conversion& conv, parm_type_t type) {
+    if (base_type(type) == PARM_REST) {
+        pPiece->uDirect = DIRECT_NOTHING;
+        return;
+    }
     const bool bUsed =
         conv.iRebuiltLength <= MAX_REBUILT_CONVERSION && conversion_fits(conv.letter, type);
     pPiece->uDirect = bUsed ? find_direct_writer(conv, type) : DIRECT_NONE;

@@ -33,10 +33,10 @@ inline uint64_t load_integer(parm_type_t type, trace_bytes bytes, int bAddr64) {
 /// Writes the sign and what fills up the width when `iDigits` digits follow.
 char* put_before_digits(char* pOut, const format_piece& piece, bool bNegative, int iDigits);
 
-/// Writes a number or a character whose writer is neither DIRECT_NONE nor
-/// DIRECT_STRING.
-inline void write_direct(text_run& out, const format_piece& piece, parm_type_t type,
-                         trace_bytes bytes, int bAddr64) {
+/// Writes a number or a character whose writer is neither DIRECT_NONE,
+/// DIRECT_NOTHING nor DIRECT_STRING.
+[[gnu::always_inline]] inline void write_direct(text_run& out, const format_piece& piece,
+                                                parm_type_t type, trace_bytes bytes, int bAddr64) {
     if (piece.uDirect == DIRECT_CHAR) {
         out.add(load<char>(bytes, 0));
         return;

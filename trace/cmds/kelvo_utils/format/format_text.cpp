@@ -155,8 +155,6 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
     case PARM_TRACE_ID:
         write_format_of_trace_id(run.out, entry.pFile, load<int32_t>(parm.bytes, 0));
         return;
-    case PARM_REST:
-        return;
     default:
         break;
     }
@@ -175,13 +173,19 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
                                                     format_piece& piece, const parm_ref& parm) {
     if (piece.uDirect == DIRECT_UNKNOWN) [[unlikely]]
         settle_writer(run, place, piece);
-    if (piece.uDirect == DIRECT_NONE)
+    switch (piece.uDirect) {
+    case DIRECT_NONE:
         write_by_text(run, place, parm);
-    else if (piece.uDirect == DIRECT_STRING)
+        break;
+    case DIRECT_NOTHING:
+        break;
+    case DIRECT_STRING:
         run.out.add(parm_string(parm));
-    else
+        break;
+    default:
         write_direct(run.out, piece, run.pEntry->pParmTypes[place.parmNum], parm.bytes,
                      run.bAddr64);
+    }
 }
 
 std::span<const conv_spec> conversions(const format_entry& entry) {

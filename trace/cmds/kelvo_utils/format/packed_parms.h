@@ -4,17 +4,17 @@
 
 #include "parms.h"
 
-#include <algorithm>
+#include <array>
+#include <cstring>
 
 /// How a packed parameter lies in its run.
 struct packed_shape {
     uint8_t uAlignment;
-    uint8_t uSize;
+    uint8_t uSize; ///< 0: a string or the rest of the run
 };
 
-/// By base type. Strings and the rest have no fixed size; a long has the shape
-/// of an int in a 32-bit file.
-inline constexpr packed_shape packedShapes[PARM_BASE_MASK + 1] = {
+/// By base type, for the traces of 64-bit programs.
+inline constexpr std::array<packed_shape, PARM_BASE_MASK + 1> packedShapes64 = {{
     {1, 0},  // 0
     {1, 1},  // PARM_CHAR
     {2, 2},  // PARM_SHORT
@@ -29,32 +29,34 @@ inline constexpr packed_shape packedShapes[PARM_BASE_MASK + 1] = {
     {1, 0},  // PARM_REST
     {4, 4},  // PARM_TRACE_ID
     {1, 0},  // unused codes
-    {1, 0},  {1, 0},
-};
+    {1, 0},
+    {1, 0},
+}};
+
+/// In those of 32-bit programs a long has the shape of an int.
+inline constexpr std::array<packed_shape, PARM_BASE_MASK + 1> packedShapes32 = [] {
+    auto shapes = packedShapes64;
+    shapes[PARM_LONG] = shapes[PARM_INT];
+    return shapes;
+}();
 
 /// Takes the parameters off a run of bytes in their order.
 class packed_parms {
 public:
     /// `bAddr64`: the traced program ran in 64-bit mode.
-    packed_parms(trace_bytes run, int bAddr64) : m_run(run), m_bAddr64(bAddr64) {}
+    packed_parms(trace_bytes run, int bAddr64)
+        : m_run(run), m_pShapes(bAddr64 ? packedShapes64.data() : packedShapes32.data()) {}
 
     /// Finds the next parameter. Returns false, and takes nothing, when it does
     /// not lie wholly inside the run.
     bool take(parm_type_t type, parm_ref* pParm) {
-        const parm_type_t base = base_type(type);
-        const bool bShortLong = base == PARM_LONG && !m_bAddr64;
-        const packed_shape& shape = bShortLong ? packedShapes[PARM_INT] : packedShapes[base];
+        const packed_shape& shape = m_pShapes[base_type(type)];
         const size_t uMask = shape.uAlignment - size_t{1};
         const size_t uStart = (m_uUsed + uMask) & ~uMask;
-        const trace_bytes rest = load_run(m_run, uStart);
-        size_t uSize = shape.uSize;
-        if (base == PARM_STRING)
-            uSize = string_size(rest);
-        else if (base == PARM_REST)
-            uSize = rest.size();
+        const size_t uSize = shape.uSize != 0 ? shape.uSize : unfixed_size(base_type(type));
         if (!lies_inside(m_run, uStart, uSize))
             return false;
-        pParm->bytes = rest;
+        pParm->bytes = m_run.subspan(uStart);
         pParm->uStringLimit = static_cast<uint32_t>(uSize);
         m_uUsed = uStart + uSize;
         return true;
@@ -66,14 +68,18 @@ public:
     }
 
 private:
-    /// Bytes that a string takes with its NUL; without one, more than there are.
-    static size_t string_size(trace_bytes bytes) {
-        if (bytes.empty())
+    /// Size of a string with its NUL (without one, more than there is), or of the
+    /// rest of the run.
+    size_t unfixed_size(parm_type_t base) const {
+        const trace_bytes left = rest();
+        if (base != PARM_STRING)
+            return base == PARM_REST ? left.size() : 0;
+        if (left.empty())
             return 1;
-        return strnlen(reinterpret_cast<const char*>(bytes.data()), bytes.size()) + 1;
+        return strnlen(reinterpret_cast<const char*>(left.data()), left.size()) + 1;
     }
 
     trace_bytes m_run;
-    int m_bAddr64;
+    const packed_shape* m_pShapes;
     size_t m_uUsed = 0;
 };

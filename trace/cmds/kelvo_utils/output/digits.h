@@ -66,20 +66,19 @@ inline char* put_hex_digits(char* pOut, uint64_t value, int digits) {
     return pOut + digits;
 }
 
+/// The first number of so many digits more than one: 0, 10, 100 and on; 0 has a
+/// digit too.
+inline constexpr auto FIRST_WITH_DIGITS = [] {
+    std::array<uint64_t, 20> numbers{};
+    for (size_t i = 1; i < numbers.size(); i++)
+        numbers[i] = i == 1 ? 10 : numbers[i - 1] * 10;
+    return numbers;
+}();
+
 /// Decimal digits of `value`; 1 for 0.
 inline int count_decimal_digits(uint64_t value) {
-    constexpr auto POWERS = [] {
-        std::array<uint64_t, 20> powers{};
-        uint64_t power = 1;
-        for (uint64_t& entry : powers) {
-            entry = power;
-            power *= 10;
-        }
-        powers[0] = 0; // 0 has a digit too
-        return powers;
-    }();
     const int guess = static_cast<int>(std::bit_width(value | 1)) * 1233 >> 12;
-    return guess + (value >= POWERS[static_cast<size_t>(guess)]);
+    return guess + (value >= FIRST_WITH_DIGITS[static_cast<size_t>(guess)]);
 }
 
 /// The eight decimal digits of `value`, below 100000000, as numbers, the first

@@ -38,6 +38,12 @@ void stdout_put(char ch) {
 }
 
 void stdout_write(std::string_view text) {
+    if (text.size() < BUFFER_SIZE - stream.uUsed && stream.terminal == terminal_state::NO)
+        [[likely]] {
+        std::memcpy(stream.pBuffer + stream.uUsed, text.data(), text.size());
+        stream.uUsed += text.size();
+        return;
+    }
     const bool bLineEnds = is_terminal() && text.find('\n') != text.npos;
     while (!text.empty()) {
         const size_t size = std::min(text.size(), BUFFER_SIZE - stream.uUsed);
@@ -52,6 +58,10 @@ void stdout_write(std::string_view text) {
 }
 
 void stdout_fill(char ch, size_t count) {
+    if (count == 1) { // most often: the blank behind a record's prefix
+        stdout_put(ch);
+        return;
+    }
     while (count > 0) {
         const size_t size = std::min(count, BUFFER_SIZE - stream.uUsed);
         std::memset(stream.pBuffer + stream.uUsed, ch, size);
