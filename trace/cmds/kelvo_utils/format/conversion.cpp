@@ -1,5 +1,7 @@
 #include "conversion.h"
 
+#include "digits.h"
+
 #include <array>
 #include <charconv>
 
@@ -27,10 +29,6 @@ constexpr uint8_t flag_bit(char ch) {
     default:
         return 0;
     }
-}
-
-constexpr bool is_digit(char ch) {
-    return ch >= '0' && ch <= '9';
 }
 
 constexpr bool is_dropped_flag(char ch) {

@@ -8,8 +8,10 @@
 #include "record_text.h"
 #include "store.h"
 
+namespace {
+
 /// The form of a block without a format.
-static void write_block_plainly(uint32_t uBlock, trace_bytes data) {
+void write_block_plainly(uint32_t uBlock, trace_bytes data) {
     text_run out;
     out.add("----------------- Data Block ");
     put_decimal(out, uBlock);
@@ -20,8 +22,8 @@ static void write_block_plainly(uint32_t uBlock, trace_bytes data) {
 
 /// Writes the format of the record, or its form without one, and moves
 /// `*pBlocks` past the blocks used. Returns their number.
-static uint32_t write_leading_blocks(const record_view& record, const format_entry* pFormat,
-                                     uint32_t uBlocks, trace_bytes* pBlocks) {
+uint32_t write_leading_blocks(const record_view& record, const format_entry* pFormat,
+                              uint32_t uBlocks, trace_bytes* pBlocks) {
     if (!pFormat) {
         text_run out;
         put_trace_id(out, record.uTraceId);
@@ -37,6 +39,8 @@ static uint32_t write_leading_blocks(const record_view& record, const format_ent
     format_parms(pFormat, &parms, record.pFile->addrMode64);
     return static_cast<uint32_t>(parms.numParms);
 }
+
+} // namespace
 
 int format_data_record(const record_view& record) {
     int insufficient_resources;

@@ -14,9 +14,6 @@
 
 namespace {
 
-/// What the text writers put in place of a text that cannot be formatted.
-constexpr std::string_view replacementText = "kelvo error in output_vprintf()";
-
 struct field_parts {
     std::string_view prefix;
     int64_t iZeros = 0;
@@ -58,7 +55,7 @@ bool is_refused(const conversion& conv) {
 void write_parts(text_run& out, const conversion& conv, const field_parts& parts) {
     const int64_t iLength = size_of(parts.prefix) + parts.iZeros + size_of(parts.digits);
     if (is_refused(conv) || iLength > INT_MAX) {
-        out.add(replacementText);
+        out.add(UNFORMATTABLE);
         return;
     }
     const int64_t iPadding = std::max<int64_t>(conv.iWidth - iLength, 0);
@@ -79,7 +76,7 @@ void write_parts(text_run& out, const conversion& conv, const field_parts& parts
 template <class T>
 void write_by_printf(text_run& out, const conversion& conv, const char* pLength, T value) {
     if (is_refused(conv)) {
-        out.add(replacementText);
+        out.add(UNFORMATTABLE);
         return;
     }
     constexpr struct {
@@ -187,12 +184,4 @@ void write_string(text_run& out, const conversion& conv, std::string_view value)
     if (conv.letter == 's' && conv.iPrecision >= 0)
         value = value.substr(0, static_cast<size_t>(conv.iPrecision));
     write_parts(out, conv, {.prefix = {}, .digits = value});
-}
-
-void write_hex(text_run& out, uint32_t uValue, int iDigits) {
-    conversion conv;
-    conv.letter = 'x';
-    conv.iPrecision = iDigits;
-    out.add("0x");
-    write_integer(out, conv, uValue, 32);
 }

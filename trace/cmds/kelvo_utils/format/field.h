@@ -7,13 +7,14 @@
 // made, beyond the characters kept.
 #pragma once
 
+#include "bounded_printf.h"
 #include "conversion.h"
 #include "text_run.h"
 
 #include <string_view>
 
 /// Characters kept of one field, as of one text of output_printf.
-inline constexpr size_t MAX_FIELD_TEXT = 4095;
+inline constexpr size_t MAX_FIELD_TEXT = BOUNDED_PRINTF_SIZE - 1;
 
 /// An integer by "diouxXp". `uValue` holds it in its lowest `iBits` bits (16,
 /// 32 or 64); the letter says whether they are signed.
@@ -24,6 +25,3 @@ void write_real(text_run& out, const conversion& conv, double value);
 
 /// A string by "s", or a character by "c" (which has no precision).
 void write_string(text_run& out, const conversion& conv, std::string_view value);
-
-/// `uValue` as "0x" and at least `iDigits` lower-case hexadecimal digits.
-void write_hex(text_run& out, uint32_t uValue, int iDigits);

@@ -8,6 +8,7 @@
 #include "direct.h"
 #include "field.h"
 #include "packed_parms.h"
+#include "record_text.h"
 #include "template_file.h"
 #include "text_run.h"
 
@@ -54,12 +55,12 @@ std::string_view parm_string(const parm_ref& parm) {
 }
 
 void write_resource_handle(text_run& out, trace_bytes bytes) {
-    write_hex(out, load<uint16_t>(bytes, 0), 4);
+    put_hex(out, load<uint16_t>(bytes, 0), 4);
     out.add(' ');
-    write_hex(out, load<uint16_t>(bytes, 2), 4);
+    put_hex(out, load<uint16_t>(bytes, 2), 4);
     for (size_t uOffset = 4; uOffset < 20; uOffset += 4) {
         out.add(' ');
-        write_hex(out, load<uint32_t>(bytes, uOffset), 8);
+        put_hex(out, load<uint32_t>(bytes, uOffset), 8);
     }
 }
 

@@ -8,13 +8,14 @@
 
 #include <cstring>
 
-static bool is_internal(const trace_record_header& header) {
+namespace {
+
+bool is_internal(const trace_record_header& header) {
     return std::memcmp(header.compId, TRC_COMP_INTERNAL, sizeof(header.compId)) == 0;
 }
 
 /// What some records change of their file before anything is written.
-static void apply_to_file(const trace_record_header& header, trace_bytes bytes,
-                          trace_file* pTraceFile) {
+void apply_to_file(const trace_record_header& header, trace_bytes bytes, trace_file* pTraceFile) {
     const uint16_t uFunction = header.function;
     if (uFunction == TRC_FUNC_TIME_CALIBRATION) {
         replace_time_base(pTraceFile, load_time_base(bytes, offsetof(time_calibration, reBase)));
@@ -30,7 +31,7 @@ static void apply_to_file(const trace_record_header& header, trace_bytes bytes,
 
 /// Looks the record's format up and writes the body. Returns 1 when memory ran
 /// out, else 0.
-static int write_body(const record_view& record) {
+int write_body(const record_view& record) {
     const record_kind* pKind = record.pKind;
     if (!pKind || !pKind->pWriter) {
         output_err_message("%s: 2625-149 Internal Error, unknown trace record type found.\n",
@@ -50,6 +51,8 @@ static int write_body(const record_view& record) {
     pKind->pWriter(record, pFormat);
     return 0;
 }
+
+} // namespace
 
 int format_record(trace_queue_element* pProcessThisElement) {
     const trace_record_header& header = pProcessThisElement->header;

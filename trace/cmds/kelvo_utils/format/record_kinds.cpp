@@ -32,29 +32,29 @@ constexpr parameter_layout STRING_AREA{sizeof(trace_record_strings), 1, 0,
 // clang-format off
 /// Each row stands at its function code.
 constexpr record_kind recordKinds[] = {
-    {TRC_FUNC_FILLER,           "FILLER",           sizeof(trace_record_header),   0,  NO_KEY,      nullptr,            NO_DATA},
-    {TRC_FUNC_ID,               "ID",               sizeof(trace_record_id),       ID, BODY_KEY,    write_values,       NO_DATA},
-    {TRC_FUNC_STRING,           "STRING",           sizeof(trace_record_string),   0,  NO_KEY,      write_string,       NO_DATA},
-    {TRC_FUNC_DATA,             "DATA",             sizeof(trace_record_data),     ID, NO_KEY,      write_data,         NO_DATA},
-    {TRC_FUNC_INT32,            "INT32",            sizeof(trace_record_int32),    ID, BODY_KEY,    write_values,       INT32},
-    {TRC_FUNC_INT32_2,          "INT32_2",          sizeof(trace_record_int32_2),  ID, BODY_KEY,    write_values,       INT32_2},
-    {TRC_FUNC_UINT32,           "UINT32",           sizeof(trace_record_uint32),   ID, BODY_KEY,    write_values,       INT32},
-    {TRC_FUNC_UINT32_2,         "UINT32_2",         sizeof(trace_record_uint32_2), ID, BODY_KEY,    write_values,       INT32_2},
-    {TRC_FUNC_INT64,            "INT64",            sizeof(trace_record_int64),    ID, BODY_KEY,    write_values,       INT64},
-    {TRC_FUNC_INT64_2,          "INT64_2",          sizeof(trace_record_int64_2),  ID, BODY_KEY,    write_values,       INT64_2},
-    {TRC_FUNC_UINT64,           "UINT64",           sizeof(trace_record_uint64),   ID, BODY_KEY,    write_values,       INT64},
-    {TRC_FUNC_UINT64_2,         "UINT64_2",         sizeof(trace_record_uint64_2), ID, BODY_KEY,    write_values,       INT64_2},
-    {TRC_FUNC_VALUES,           "VALUES",           sizeof(trace_record_values),   ID, BODY_KEY,    write_value_array,  ARRAY32},
-    {TRC_FUNC_VALUES64,         "VALUES64",         sizeof(trace_record_values),   ID, BODY_KEY,    write_value_array,  ARRAY64},
-    {TRC_FUNC_ERROR,            "ERROR",            sizeof(trace_record_error),    ID, BODY_KEY,    write_error,        NO_DATA},
-    {TRC_FUNC_STRINGS,          "STRINGS",          sizeof(trace_record_strings),  ID, BODY_KEY,    write_string_array, STRING_AREA},
-    {TRC_FUNC_START,            "START",            sizeof(trace_record_start),    ID, START_KEY,   write_start,        PID},
-    {TRC_FUNC_TIME_CALIBRATION, "TIME_CALIBRATION", sizeof(time_calibration),      0,  NO_KEY,      nullptr,            NO_DATA},
-    {18,                        nullptr,            0,                             0,  NO_KEY,      nullptr,            NO_DATA},
-    {TRC_FUNC_RESTART,          "RESTART",          sizeof(trace_record_start),    ID, RESTART_KEY, write_start,        PID},
+    {TRC_FUNC_FILLER,           "FILLER",           0,  NO_KEY,      nullptr,            NO_DATA},
+    {TRC_FUNC_ID,               "ID",               ID, BODY_KEY,    write_values,       NO_DATA},
+    {TRC_FUNC_STRING,           "STRING",           0,  NO_KEY,      write_string,       NO_DATA},
+    {TRC_FUNC_DATA,             "DATA",             ID, NO_KEY,      write_data,         NO_DATA},
+    {TRC_FUNC_INT32,            "INT32",            ID, BODY_KEY,    write_values,       INT32},
+    {TRC_FUNC_INT32_2,          "INT32_2",          ID, BODY_KEY,    write_values,       INT32_2},
+    {TRC_FUNC_UINT32,           "UINT32",           ID, BODY_KEY,    write_values,       INT32},
+    {TRC_FUNC_UINT32_2,         "UINT32_2",         ID, BODY_KEY,    write_values,       INT32_2},
+    {TRC_FUNC_INT64,            "INT64",            ID, BODY_KEY,    write_values,       INT64},
+    {TRC_FUNC_INT64_2,          "INT64_2",          ID, BODY_KEY,    write_values,       INT64_2},
+    {TRC_FUNC_UINT64,           "UINT64",           ID, BODY_KEY,    write_values,       INT64},
+    {TRC_FUNC_UINT64_2,         "UINT64_2",         ID, BODY_KEY,    write_values,       INT64_2},
+    {TRC_FUNC_VALUES,           "VALUES",           ID, BODY_KEY,    write_value_array,  ARRAY32},
+    {TRC_FUNC_VALUES64,         "VALUES64",         ID, BODY_KEY,    write_value_array,  ARRAY64},
+    {TRC_FUNC_ERROR,            "ERROR",            ID, BODY_KEY,    write_error,        NO_DATA},
+    {TRC_FUNC_STRINGS,          "STRINGS",          ID, BODY_KEY,    write_string_array, STRING_AREA},
+    {TRC_FUNC_START,            "START",            ID, START_KEY,   write_start,        PID},
+    {TRC_FUNC_TIME_CALIBRATION, "TIME_CALIBRATION", 0,  NO_KEY,      nullptr,            NO_DATA},
+    {18,                        nullptr,            0,  NO_KEY,      nullptr,            NO_DATA},
+    {TRC_FUNC_RESTART,          "RESTART",          ID, RESTART_KEY, write_start,        PID},
 };
 constexpr record_kind discardedKind =
-    {TRC_FUNC_DISCARDED,        "DISCARDED",        sizeof(trace_record_header),   0,  NO_KEY,      write_discarded,    NO_DATA};
+    {TRC_FUNC_DISCARDED,        "DISCARDED",        0,  NO_KEY,      write_discarded,    NO_DATA};
 // clang-format on
 
 constexpr bool rows_stand_at_their_code() {

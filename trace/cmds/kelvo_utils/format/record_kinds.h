@@ -30,7 +30,6 @@ struct parameter_layout {
 struct record_kind {
     uint16_t uFunction; ///< a trace_function
     const char* pName;
-    uint32_t uShortest;      ///< length of the fixed part
     uint32_t uTraceIdOffset; ///< 0: the body has no trace id
     int iTemplateKey;        ///< a trace id or TEMPLATE_KEY_*
     record_writer pWriter;   ///< null: never written

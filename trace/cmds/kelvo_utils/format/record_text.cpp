@@ -4,9 +4,13 @@
 
 #include <charconv>
 
-static std::string_view text_between(const char* pStart, const char* pEnd) {
+namespace {
+
+std::string_view text_between(const char* pStart, const char* pEnd) {
     return {pStart, static_cast<size_t>(pEnd - pStart)};
 }
+
+} // namespace
 
 void put_hex(text_run& out, uint64_t uValue, int iDigits) {
     char text[2 + DIGITS_ROOM] = {'0', 'x'};

@@ -2,8 +2,12 @@
 #include "record_bodies.h"
 #include "record_text.h"
 
+namespace {
+
 /// Trace id of an array of strings that has none.
-static constexpr uint32_t NO_TRACE_ID = 0xFFFFFFFF;
+constexpr uint32_t NO_TRACE_ID = 0xFFFFFFFF;
+
+} // namespace
 
 void write_string(const record_view& record, const format_entry*) {
     text_run out;

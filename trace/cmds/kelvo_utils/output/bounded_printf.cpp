@@ -6,6 +6,8 @@
 // stay the same, and the length is counted as it would have been.
 #include "bounded_printf.h"
 
+#include "digits.h"
+
 #include <algorithm>
 #include <climits>
 #include <cmath>
@@ -71,10 +73,6 @@ struct text_sink {
         total += std::max<int64_t>(count, 0);
     }
 };
-
-bool is_digit(char ch) {
-    return ch >= '0' && ch <= '9';
-}
 
 // Whether a width or precision could be large: a '*', or four digits or more.
 bool may_be_large(const char* pFormat) {

@@ -1,4 +1,4 @@
-// Numbers as text without a printf: each function writes at `pOut` and returns
+// Numbers as text without a printf: each put_ function writes at `pOut` and returns
 // the position after what it wrote. Nothing is terminated.
 #pragma once
 
@@ -9,6 +9,11 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+
+/// Whether `ch` is a decimal digit, in every locale.
+constexpr bool is_digit(char ch) {
+    return ch >= '0' && ch <= '9';
+}
 
 /// Room that one call needs when its width is not above 20.
 inline constexpr size_t DIGITS_ROOM = 20;

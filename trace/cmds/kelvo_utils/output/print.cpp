@@ -9,8 +9,6 @@
 
 namespace {
 
-constexpr std::string_view REPLACEMENT = "kelvo error in output_vprintf()";
-
 using format_buffer = char[BOUNDED_PRINTF_SIZE];
 
 // The formatted text, cut at what the buffer keeps, or the replacement.
@@ -18,7 +16,7 @@ __attribute__((format(printf, 2, 0))) std::string_view
 format_text(format_buffer& buffer, const char* pFormat, va_list args) {
     const int length = bounded_vsnprintf(buffer, sizeof buffer, pFormat, args);
     if (length < 0)
-        return REPLACEMENT;
+        return UNFORMATTABLE;
     return {buffer, std::min(static_cast<size_t>(length), sizeof buffer - 1)};
 }
 

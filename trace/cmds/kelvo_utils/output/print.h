@@ -3,9 +3,12 @@
 #pragma once
 
 #include <cstdarg>
+#include <string_view>
 
-/// Writes the formatted text, or "kelvo error in output_vprintf()" when the
-/// format cannot be formatted.
+/// Stands in place of a text that cannot be formatted.
+inline constexpr std::string_view UNFORMATTABLE = "kelvo error in output_vprintf()";
+
+/// Writes the formatted text, or UNFORMATTABLE.
 void output_vprintf(const char* pFormat, va_list pArgs) __attribute__((format(printf, 1, 0)));
 
 /// output_vprintf with the arguments given in place.

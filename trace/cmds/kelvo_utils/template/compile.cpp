@@ -12,6 +12,7 @@
 // one block at the end, so that a refused string leaves nothing behind.
 #include "compile.h"
 
+#include "digits.h"
 #include "messages.h"
 
 #include <cstdlib>
@@ -76,10 +77,6 @@ struct star_place {
     size_t uOffset = 0;
     uint8_t parmNum = NO_PARM;
 };
-
-constexpr bool is_digit(char ch) {
-    return ch >= '0' && ch <= '9';
-}
 
 const char* skip_digits(const char* pText) {
     while (is_digit(*pText))

@@ -6,7 +6,7 @@
 #include <string_view>
 
 /// The component that the internal formats belong to; it has no template file.
-inline constexpr std::string_view INTERNAL_COMPONENT = "____";
+inline constexpr std::string_view INTERNAL_COMPONENT = TRC_COMP_INTERNAL;
 
 struct fmtList {
     format_entry* pEntry; ///< null until first used; kept to the end of the process

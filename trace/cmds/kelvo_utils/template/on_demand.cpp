@@ -15,9 +15,7 @@ constexpr int CHAIN_BITS = 12;
 template_file* chains[1u << CHAIN_BITS];
 
 template_file*& chain_of(const char* compId) {
-    uint32_t uId;
-    std::memcpy(&uId, compId, sizeof(uId));
-    return chains[uId * 2654435769u >> (32 - CHAIN_BITS)];
+    return chains[component_hash(compId, CHAIN_BITS)];
 }
 
 /// Reads the first file that the path has for the template's component; the

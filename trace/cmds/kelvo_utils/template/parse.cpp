@@ -9,6 +9,7 @@
 #include "parse.h"
 
 #include "compile.h"
+#include "digits.h"
 #include "messages.h"
 
 #include <cstdlib>
@@ -46,10 +47,6 @@ struct template_parser {
 
 constexpr bool contains(std::string_view set, char ch) {
     return set.find(ch) != std::string_view::npos;
-}
-
-constexpr bool is_digit(char ch) {
-    return ch >= '0' && ch <= '9';
 }
 
 size_t format_buffer_size() {

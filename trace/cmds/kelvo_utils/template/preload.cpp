@@ -121,9 +121,7 @@ void template_file_destroy_action(template_file* pTemplate) {
 } // namespace
 
 template_file* find_preloaded_template(const char* compId) {
-    uint32_t uId;
-    std::memcpy(&uId, compId, sizeof(uId));
-    tree_answer& answer = answers[uId * 2654435769u >> (32 - ANSWER_BITS)];
+    tree_answer& answer = answers[component_hash(compId, ANSWER_BITS)];
     if (!answer.bKnown || std::memcmp(answer.compId, compId, sizeof(answer.compId)) != 0) {
         answer.bKnown = true;
         std::memcpy(answer.compId, compId, sizeof(answer.compId));

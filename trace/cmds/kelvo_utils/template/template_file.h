@@ -4,7 +4,15 @@
 #include "kelvo.h"
 
 #include <cstdio>
+#include <cstring>
 #include <memory>
+
+/// A number below 1 << iBits that parts component ids (4 characters) well.
+inline uint32_t component_hash(const char* compId, int iBits) {
+    uint32_t uId;
+    std::memcpy(&uId, compId, sizeof(uId));
+    return uId * 2654435769U >> (32 - iBits);
+}
 
 /// Releases a template with its entries and its index.
 void release_template(template_file* pTemplate);
