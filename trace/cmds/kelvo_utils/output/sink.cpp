@@ -78,10 +78,9 @@ void output_char(char ch) {
 }
 
 void output_text(std::string_view text) {
-    while (!text.empty() && (anchor.outputFlags & OUTPUT_START_PENDING) != 0) {
-        output_char(text.front());
+    while (!text.empty() && (anchor.outputFlags & OUTPUT_START_PENDING) != 0 &&
+           !start_body(text.front()))
         text.remove_prefix(1);
-    }
     while (!text.empty()) {
         // A run is the rest of a line with its newline, or, where nothing is
         // indented, all the text up to its last newline.
