@@ -14,7 +14,7 @@ if(KELVO_FUZZ)
 endif()
 
 # What every record passes through is worth more than CMake's -O2, a tenth of
-# kelvo's time. The tests are not.
+# kelvo's time. Tests and tools are not.
 if(NOT KELVO_SANITIZE)
   set(KELVO_OPTIMISE $<$<CONFIG:RelWithDebInfo>:-O3>)
 endif()
