@@ -7,27 +7,25 @@
 #include <vector>
 
 /// Every kind that a sound file may hold.
-inline constexpr uint16_t SAMPLE_KINDS[] = {
-    TRC_FUNC_ID,
-    TRC_FUNC_STRING,
-    TRC_FUNC_DATA,
-    TRC_FUNC_INT32,
-    TRC_FUNC_INT32_2,
-    TRC_FUNC_UINT32,
-    TRC_FUNC_UINT32_2,
-    TRC_FUNC_INT64,
-    TRC_FUNC_INT64_2,
-    TRC_FUNC_UINT64,
-    TRC_FUNC_UINT64_2,
-    TRC_FUNC_VALUES,
-    TRC_FUNC_VALUES64,
-    TRC_FUNC_ERROR,
-    TRC_FUNC_STRINGS,
-    TRC_FUNC_START,
-    TRC_FUNC_TIME_CALIBRATION,
-    TRC_FUNC_RESTART,
-    TRC_FUNC_DISCARDED,
-};
+inline constexpr uint16_t SAMPLE_KINDS[] = {TRC_FUNC_ID,
+                                            TRC_FUNC_STRING,
+                                            TRC_FUNC_DATA,
+                                            TRC_FUNC_INT32,
+                                            TRC_FUNC_INT32_2,
+                                            TRC_FUNC_UINT32,
+                                            TRC_FUNC_UINT32_2,
+                                            TRC_FUNC_INT64,
+                                            TRC_FUNC_INT64_2,
+                                            TRC_FUNC_UINT64,
+                                            TRC_FUNC_UINT64_2,
+                                            TRC_FUNC_VALUES,
+                                            TRC_FUNC_VALUES64,
+                                            TRC_FUNC_ERROR,
+                                            TRC_FUNC_STRINGS,
+                                            TRC_FUNC_START,
+                                            TRC_FUNC_TIME_CALIBRATION,
+                                            TRC_FUNC_RESTART,
+                                            TRC_FUNC_DISCARDED};
 
 /// A body for a record of the kind, with every part that the kind can have; its
 /// trace id is the kind's code.

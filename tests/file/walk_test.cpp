@@ -2,7 +2,6 @@
 
 #include "first_record.h"
 #include "memory_trace.h"
-#include "start.h"
 
 #include <gtest/gtest.h>
 
@@ -195,54 +194,6 @@ TEST(Walk, ends_on_a_ring_of_fillers_and_notices_a_writer_that_goes_on) {
         EXPECT_EQ(trace.file.pHeader->uSeqLock, TRC_SEQ_FILLER + 2);
         EXPECT_EQ(trace.file.uUncountedBytes, 0U);
     }
-}
-
-/// Everything that a reader task does with a file. Returns the steps it took.
-uint64_t read_to_the_end(trace_file& file) {
-    cu_nanoseconds time;
-    oldest_record_time(&file, &time);
-    uint64_t uSteps = 0;
-    trace_record_header header;
-    if (find_first_record(&file) != 0 || set_file_start(&file) != 0)
-        return 0;
-    while (is_last_record(&file, &header) == WALK_RECORD) {
-        record_bytes(&file, file.pCurRec, header.length);
-        start_is_reached(&file, header);
-        if (step_to_next_record(&file, header) != WALK_RECORD)
-            break;
-        ++uSteps;
-    }
-    return uSteps;
-}
-
-TEST(Walk, stays_inside_any_file_and_comes_to_an_end) {
-    constexpr uint32_t SIZE = 400;
-    const int64_t lengths[] = {0, 1, 27, 28, 60, 100, 171, 172, 200, 0x7FFFFFFF, 0xFFFFFFFF};
-    const uint32_t positions[] = {0, 4, 199, 200, 203, 228, 260, 372, 373, 400, 0xFFFFFFFF};
-    const uint16_t kinds[] = {0, 1, 16, 0xFFFE, 0xFFFF};
-    CaptureStderr();
-    for (const int64_t iLength : lengths)
-        for (const int64_t iSecond : lengths)
-            for (const uint16_t uKind : kinds)
-                for (const uint32_t uOldest : positions)
-                    for (const uint32_t uOffset : positions) {
-                        raw_trace raw(SIZE);
-                        raw.put(
-                            200,
-                            {.function = uKind, .seqNumber = TRC_SEQ_FILLER, .length = iLength});
-                        raw.put(
-                            260,
-                            {.function = uKind, .seqNumber = TRC_SEQ_FILLER, .length = iSecond});
-                        raw.header.uOldestRecordOffset = uOldest;
-                        raw.header.uOffset = uOffset;
-                        memory_trace trace(raw);
-                        anchor.startOptions = static_cast<int32_t>((uOldest + uOffset) % 6);
-                        ASSERT_LE(read_to_the_end(trace.file), 2 * SIZE / 28)
-                            << iLength << ' ' << iSecond << ' ' << uKind << ' ' << uOldest << ' '
-                            << uOffset;
-                    }
-    anchor.startOptions = START_NONE;
-    GetCapturedStderr();
 }
 
 } // namespace

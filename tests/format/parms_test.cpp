@@ -380,34 +380,3 @@ TEST(parms, every_value_prints_as_printf_prints_it) {
     }
     EXPECT_EQ(rest, "");
 }
-
-// Every byte that the formats below could reach past the vectors is poison to
-// the address sanitizer.
-TEST(parms, hostile_bytes_stay_inside_their_record) {
-    const std::string formats[] = {
-        "%d%s%ld%z",     "%s%s%s%s",          "%r%r%d",           "%*.*f %*s %.*s",
-        "%c%hd%d%lld%p", "%1$s %2$*1$d %3$s", "%Lf%hf%lf%T%s%*c", "%2$*1$.*3$s%1$lld %3$r",
-    };
-    std::mt19937_64 engine(7);
-    const auto below = [&](size_t uLimit) { return static_cast<size_t>(engine() % uLimit); };
-    static parm_list list;
-    const std::string output = output_of([&] {
-        for (int i = 0; i < 1'000; i++) {
-            const entry_ptr pEntry = compile(formats[below(std::size(formats))]);
-            byte_vector bytes(below(80));
-            for (std::byte& byte : bytes)
-                byte = static_cast<std::byte>(below(3) ? below(4) : engine());
-            for (const int bAddr64 : {0, 1}) {
-                trace_bytes run = bytes;
-                bld_parm_list_packed(pEntry.get(), &run, bAddr64, &list);
-                ASSERT_LE(run.size(), bytes.size());
-                format_parms(pEntry.get(), &list, bAddr64);
-                trace_bytes blocks = bytes;
-                bld_parm_list_unpacked(pEntry.get(), &blocks, static_cast<uint32_t>(engine()),
-                                       &list);
-                format_parms(pEntry.get(), &list, bAddr64);
-            }
-        }
-    });
-    EXPECT_EQ(output.back(), '\n');
-}

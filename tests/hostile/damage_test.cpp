@@ -55,13 +55,13 @@ TEST_F(Damage, EveryPrefix) {
 
 TEST_F(Damage, EveryPrefixThatClaimsToBeWhole) {
     const std::vector<std::byte> sound = full_ring_of(SAMPLE_KINDS).bytes();
-    const std::vector<written_record> records = write_records_of(sound).records;
+    const std::vector<written_record> records = write_records_of(sound, FORM_ALL).records;
     for (size_t uSize = AREA; uSize < sound.size(); ++uSize) {
         std::vector<std::byte> file(sound.begin(), sound.begin() + static_cast<ptrdiff_t>(uSize));
         const auto uActualFileSize = static_cast<uint32_t>(uSize);
         memcpy(file.data() + offsetof(trace_file_header, uActualFileSize), &uActualFileSize,
                sizeof(uActualFileSize));
-        const written_file cut = write_records_of(file);
+        const written_file cut = write_records_of(file, FORM_ALL);
         ASSERT_EQ(cut.result.bAccepted, uSize >= AREA + HEADER) << uSize;
 
         // The whole records, and then perhaps the one that is cut.

@@ -180,34 +180,4 @@ TEST_F(Compile, MemoryExhaustionIsSilentAndLeavesTheTemplate) {
     EXPECT_EQ(file.pFormats, nullptr);
 }
 
-TEST_F(Compile, RandomStringsCompileToConversionsInsideThem) {
-    std::mt19937 random(5);
-    const std::string alphabet = "%%%%$**.0123-lhLdsfcxzT \x80\n";
-    messages_of([&] {
-        for (int round = 0; round < 20000; ++round) {
-            std::string format;
-            for (size_t uLeft = random() % 40; uLeft > 0; --uLeft)
-                format += random() % 16 ? alphabet[random() % alphabet.size()]
-                                        : static_cast<char>(random());
-            format_entry* const pEntry = parse_format_string(format.c_str(), nullptr);
-            if (pEntry == nullptr)
-                continue;
-            size_t uEnd = 0;
-            for (int i = 0; i < pEntry->numConvs; ++i) {
-                const conv_spec& conv = pEntry->pConvSpecs[i];
-                ASSERT_GE(conv.offset, uEnd);
-                ASSERT_EQ(pEntry->pString[conv.offset], '%');
-                ASSERT_LT(conv.parmNum, pEntry->numParms);
-                ASSERT_TRUE(conv.widthOffset == 0 ||
-                            pEntry->pString[conv.offset + conv.widthOffset] == '*');
-                uEnd = size_t{conv.offset} + conv.lenConv;
-            }
-            ASSERT_LE(uEnd, strlen(pEntry->pString));
-            for (int i = 0; i < pEntry->numParms; ++i)
-                ASSERT_NE(pEntry->pParmTypes[i], PARM_UNREFERENCED);
-            std::free(pEntry);
-        }
-    });
-}
-
 } // namespace

@@ -205,19 +205,4 @@ TEST_F(Parse, OnlyTheFormatBufferSetsTheMemoryFlag) {
     EXPECT_EQ(insufficient_resources, 0);
 }
 
-TEST_F(Parse, RandomFilesNeverFailButForTheirFormats) {
-    std::mt19937 random(6);
-    const std::string alphabet = "0018xaF:\"\"\"\"\\\\n#\n \0\xFF%d$"s;
-    for (int round = 0; round < 3000; ++round) {
-        std::string text;
-        for (size_t uLeft = random() % 200; uLeft > 0; --uLeft)
-            text += alphabet[random() % alphabet.size()];
-        const parse_outcome outcome = parse(text);
-        ASSERT_TRUE(outcome.iResult == 0 || outcome.iResult == 1);
-        if (outcome.iResult == 0) {
-            ASSERT_EQ(outcome.lineNumber, std::count(text.begin(), text.end(), '\n'));
-        }
-    }
-}
-
 } // namespace
