@@ -1,10 +1,13 @@
-// The protocol with a reader, step by step on one thread; a reader that dies;
-// and the whole of it with reader and writer on two threads.
-#include "live_reader.h"
+// The protocol with the command's own reader, step by step on one thread; a
+// reader that dies; and the whole of it with reader and writer on two threads.
+#include "first_record.h"
 #include "raw_trace.h"
 #include "reference_reader.h"
+#include "ring.h"
+#include "shared_words.h"
 #include "temp_dir.h"
 #include "trace_writer.h"
+#include "walk.h"
 
 #include <algorithm>
 #include <atomic>
@@ -19,6 +22,53 @@
 namespace {
 
 constexpr uint32_t HEADER = sizeof(trace_file_header);
+
+/// A reader in the mapping of the writer, its steps one by one.
+class live_reader {
+public:
+    explicit live_reader(std::span<std::byte> mapped) {
+        file.pName = name;
+        file.pHeader = reinterpret_cast<trace_file_header*>(mapped.data());
+        file.pMapEnd = ring_position(&file, mapped.size());
+        file.pWrap = ring_position(&file, file.pHeader->uOffset);
+    }
+
+    void raise_request() {
+        store_tail_request(file.pHeader, TRC_TAIL_REQUESTED);
+    }
+    bool is_acknowledged() const {
+        return tail_request_is_acknowledged(file.pHeader);
+    }
+    bool find_first() {
+        return find_first_record(&file) == 0;
+    }
+    void lower_request() {
+        release_tail(&file);
+    }
+    walk_result look() {
+        return is_last_record(&file, &header);
+    }
+    /// The number in the record that look() has found.
+    uint32_t number() const {
+        return load<uint32_t>(record_bytes(&file, file.pCurRec, header.length), sizeof(header));
+    }
+    void step() {
+        step_to_next_record(&file, header);
+    }
+    void close() {
+        release_tail(&file);
+        store_seq_lock(file.pHeader, TRC_SEQ_NO_READER);
+    }
+    uint64_t offset() const {
+        return ring_offset(&file, file.pCurRec);
+    }
+
+    trace_record_header header{};
+
+private:
+    char name[6] = "trace";
+    trace_file file{};
+};
 
 class live_trace : public testing::Test {
 protected:
@@ -51,12 +101,12 @@ protected:
     static std::vector<uint32_t> read(live_reader& reader, size_t uMost = SIZE_MAX) {
         std::vector<uint32_t> numbers;
         while (numbers.size() < uMost) {
-            const live_reader::result result = reader.look();
-            EXPECT_NE(result, live_reader::CORRUPT);
-            if (result != live_reader::RECORD)
+            const walk_result result = reader.look();
+            EXPECT_NE(result, WALK_CORRUPT);
+            if (result != WALK_RECORD)
                 break;
             if (reader.header.function != TRC_FUNC_FILLER)
-                numbers.push_back(load<uint32_t>(reader.body, 0));
+                numbers.push_back(reader.number());
             reader.step();
         }
         return numbers;
@@ -129,7 +179,7 @@ TEST_F(live_trace, nothing_is_given_up_that_the_reader_has_not_passed) {
     for (size_t uStep = 1; uStep <= 3; ++uStep) {
         const numbers passed = read(reader, uStep);
         ASSERT_EQ(passed.size(), uStep);
-        ASSERT_EQ(reader.look(), live_reader::RECORD); // the next one is being copied
+        ASSERT_EQ(reader.look(), WALK_RECORD); // the next one is being copied
         uNext = passed.back() + 1;
         while (append() == TRACE_WRITER_OK)
             ASSERT_EQ(problem(), "");
@@ -253,13 +303,13 @@ protected:
         reader.lower_request();
         numbers seen;
         while (bSound && seen.size() < uMost) {
-            const live_reader::result result = reader.look();
-            bSound = result != live_reader::CORRUPT;
-            if (result == live_reader::RECORD) {
+            const walk_result result = reader.look();
+            bSound = result != WALK_CORRUPT;
+            if (result == WALK_RECORD) {
                 if (reader.header.function == TRC_FUNC_ID)
-                    seen.push_back(load<uint32_t>(reader.body, 0));
+                    seen.push_back(reader.number());
                 reader.step();
-            } else if (bWritten.load() && result == live_reader::NO_RECORD) {
+            } else if (bWritten.load() && result == WALK_NO_RECORD) {
                 break;
             } else {
                 std::this_thread::yield();
@@ -280,6 +330,7 @@ protected:
 TEST_P(live_stress, reader_sees_every_record_once_and_in_order) {
     make(GetParam());
     const uint32_t uLongest = std::max(36U, std::min(writer.max_record_length(), 600U));
+    testing::internal::CaptureStderr();
     std::thread reading([this] {
         for (int i = 0; i < 40 && !HasFailure(); ++i)
             read_session(i % 2 == 0 ? 50 : 1500);
@@ -287,6 +338,7 @@ TEST_P(live_stress, reader_sees_every_record_once_and_in_order) {
     });
     write_all(uLongest);
     reading.join();
+    EXPECT_EQ(testing::internal::GetCapturedStderr(), "");
 
     EXPECT_EQ(problem(), "");
     size_t uSeen = 0;

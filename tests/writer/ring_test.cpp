@@ -5,11 +5,9 @@
 #include "temp_dir.h"
 #include "trace_writer.h"
 
-#include <csignal>
 #include <deque>
 #include <gtest/gtest.h>
 #include <random>
-#include <sys/wait.h>
 #include <unistd.h>
 
 namespace {
@@ -68,32 +66,16 @@ TEST(trace_ring, holds_the_newest_records_after_random_appends) {
     const temp_dir dir;
     std::mt19937 engine(4711);
     const auto random = [&engine] { return static_cast<uint32_t>(engine()); };
-    for (const uint32_t uArea : {56U, 60U, 84U, 200U, 1000U, 4096U}) {
+    std::vector<uint32_t> areas{1000, 4096};
+    for (uint32_t uArea = 56; uArea <= 180; uArea += 4)
+        areas.push_back(uArea);
+    for (const uint32_t uArea : areas) {
         SCOPED_TRACE(uArea);
         checked_writer writer(dir.file("ring"), uArea);
         const uint32_t uMax = writer.writer.max_record_length();
         for (int i = 0; i < 1500 && !testing::Test::HasFatalFailure(); ++i) {
             const uint32_t uLongest = random() % 8 == 0 ? uMax : std::min(uMax, 100U);
             writer.append(28 + random() % (uLongest - 28 + 1));
-        }
-    }
-}
-
-TEST(trace_ring, goes_round_the_end_at_every_alignment) {
-    const temp_dir dir;
-    for (uint32_t uArea = 56; uArea <= 180; uArea += 4) {
-        checked_writer writer(dir.file("ring"), uArea);
-        const uint32_t uMax = writer.writer.max_record_length();
-        for (uint32_t uFirst = 28; uFirst <= uMax; uFirst += 4) {
-            for (uint32_t uSecond = 28; uSecond <= uMax; uSecond += 4) {
-                SCOPED_TRACE(testing::Message() << uArea << " " << uFirst << " " << uSecond);
-                for (int i = 0; i < 3; ++i) {
-                    writer.append(uFirst);
-                    writer.append(uSecond);
-                    if (testing::Test::HasFatalFailure())
-                        return;
-                }
-            }
         }
     }
 }
@@ -195,39 +177,6 @@ TEST(trace_ring, reaches_up_to_four_gibibytes) {
     EXPECT_EQ(uint32_t{gap.length}, 0xFFFFFFFC - 232);
     const trace_bytes tooLong(writer.mapping().data(), writer.max_record_length() - 27);
     EXPECT_EQ(writer.append(TRC_FUNC_DATA, {"_TST"}, tooLong), TRACE_WRITER_TOO_LONG);
-}
-
-TEST(trace_ring, stays_sound_when_the_writer_is_killed) {
-    const temp_dir dir;
-    const std::string path = dir.file("trace");
-    for (int iRound = 0; iRound < 40; ++iRound) {
-        const pid_t pid = fork();
-        ASSERT_GE(pid, 0);
-        if (pid == 0) {
-            trace_writer writer;
-            trace_writer_options options;
-            options.uFileSize = 2000;
-            if (writer.create((path + ".new").c_str(), options) != TRACE_WRITER_OK ||
-                rename((path + ".new").c_str(), path.c_str()) != 0)
-                _exit(1);
-            const std::byte body[300]{};
-            for (unsigned i = 0;; ++i)
-                writer.append(TRC_FUNC_DATA, {"_TST", 1, i},
-                              trace_bytes(body).first(8 + i * 7 % 290));
-        }
-        usleep(static_cast<useconds_t>(2000 + 37 * iRound));
-        kill(pid, SIGKILL);
-        int status = 0;
-        ASSERT_EQ(waitpid(pid, &status, 0), pid);
-        ASSERT_TRUE(WIFSIGNALED(status));
-        if (access(path.c_str(), F_OK) != 0)
-            continue; // killed before there was a file
-        const ring_listing ring = list_ring(read_file(path));
-        // The record that was being written may have no number yet.
-        if (ring.problem.find("4095") == std::string::npos) {
-            EXPECT_EQ(ring.problem, "");
-        }
-    }
 }
 
 } // namespace
