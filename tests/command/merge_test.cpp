@@ -105,29 +105,6 @@ TEST_F(Merge, ThreeInterleavedFilesComeOutInTimeOrderWithTiesKeptPerFile) {
     expect_merged(parse_printed(result.sOut), 3, 100'000);
 }
 
-TEST_F(Merge, ManyFilesOneAfterTheOtherNeedFewDescriptors) {
-    constexpr uint32_t FILES = 300, RECORDS = 2000;
-    for (uint32_t uFile = 0; uFile < FILES; ++uFile) {
-        std::vector<sample_record> records;
-        for (uint32_t i = 0; i < RECORDS; ++i)
-            records.push_back(sample_uint32((uint64_t{uFile} * RECORDS + i) * 1000, 1, i));
-        make(uFile, records);
-    }
-    std::shuffle(m_paths.begin(), m_paths.end(), std::mt19937(1));
-    command_setup shell;
-    shell.sProgram = "/bin/sh";
-    std::vector<std::string> arguments{"-c", "ulimit -n 64; exec \"$0\" -r -ot \"$@\"",
-                                       KELVO_PROGRAM};
-    arguments.insert(arguments.end(), m_paths.begin(), m_paths.end());
-    const command_result result = run_command(arguments, shell);
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.sErr, "");
-    const std::vector<printed> records = parse_printed(result.sOut);
-    ASSERT_EQ(records.size(), FILES * RECORDS);
-    for (size_t i = 0; i < records.size(); ++i)
-        ASSERT_EQ(records[i].uTime, i * 1000);
-}
-
 TEST_F(Merge, SixtyFilesAtOnce) {
     for (uint32_t uFile = 0; uFile < 60; ++uFile) {
         std::vector<sample_record> records;
@@ -267,28 +244,6 @@ uint32_t header_word(const std::string& sPath, size_t uOffset) {
     return load<uint32_t>(read_file(sPath), uOffset);
 }
 
-TEST_F(Merge, AFileInUseIsNamedAndTheOthersGoOn) {
-    for (uint32_t uFile = 0; uFile < 2; ++uFile)
-        make(uFile, {sample_uint32(1, 1, uFile), sample_uint32(2, 1, uFile)});
-    const int fd = open(m_paths[0].c_str(), O_RDWR);
-    struct flock lock {};
-    lock.l_type = F_WRLCK;
-    ASSERT_EQ(fcntl(fd, F_SETLK, &lock), 0);
-    const std::vector<std::byte> before = read_file(m_paths[0]);
-    // Closing any descriptor of the file has dropped the lock: take it again.
-    ASSERT_EQ(fcntl(fd, F_SETLK, &lock), 0);
-
-    const command_result result = run();
-    EXPECT_EQ(result.status, 1);
-    EXPECT_THAT(result.sOut, HasSubstr(KELVO_PROGRAM ": 2625-161 Trace file \"" + m_paths[0] +
-                                       "\" is already in use.\n"));
-    EXPECT_EQ(parse_printed(result.sOut).size(), 2U);
-
-    EXPECT_EQ(parse_printed(run({"-z", "-r", "-ot"}).sOut).size(), 4U);
-    close(fd);
-    EXPECT_EQ(read_file(m_paths[0]).size(), before.size());
-}
-
 TEST_F(Merge, AReadFileKeepsItsBytesAndGetsTheTimeOfItsNewestRecord) {
     make(0, {sample_uint32(5'000'001'234, 1, 0), sample_uint32(7'000'009'999, 1, 1)});
     std::vector<std::byte> expected = read_file(m_paths[0]);
@@ -300,30 +255,6 @@ TEST_F(Merge, AReadFileKeepsItsBytesAndGetsTheTimeOfItsNewestRecord) {
     ASSERT_EQ(stat(m_paths[0].c_str(), &status), 0);
     EXPECT_EQ(status.st_mtim.tv_sec, 7);
     EXPECT_EQ(status.st_mtim.tv_nsec, 9000);
-}
-
-TEST_F(Merge, ARejectedFileKeepsEveryByteAndItsTimes) {
-    raw_trace rejected(4096);
-    rejected.add({.body = raw_bytes(uint32_t{1})});
-    rejected.add_rest();
-    rejected.header.uVersion = 7;
-    rejected.header.uSeqLock = 17;
-    rejected.header.uTailReq = 18;
-    m_paths.push_back(m_dir.file("rejected.trc"));
-    ASSERT_TRUE(rejected.write(m_paths[0]));
-    const timespec times[2] = {{1'000'000, 5}, {2'000'000, 6}};
-    ASSERT_EQ(utimensat(AT_FDCWD, m_paths[0].c_str(), times, 0), 0);
-    make(1, {sample_uint32(1, 1, 0)});
-
-    const command_result result = run();
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.sErr, KELVO_PROGRAM ": 2625-107 File \"" + m_paths[0] +
-                               "\" is not a valid trace file.\n\n");
-    EXPECT_EQ(parse_printed(result.sOut).size(), 1U);
-    EXPECT_EQ(read_file(m_paths[0]), rejected.bytes());
-    struct stat status {};
-    ASSERT_EQ(stat(m_paths[0].c_str(), &status), 0);
-    EXPECT_EQ(status.st_mtim.tv_sec, 2'000'000);
 }
 
 } // namespace

@@ -63,12 +63,6 @@ void write_for_ever(int fd) {
 
 // What a thread other than the main one does to it.
 
-void* interrupt_main(void*) {
-    usleep(20000);
-    kill(getpid(), SIGINT);
-    return nullptr;
-}
-
 void* break_pipe(void*) {
     int fds[2];
     if (pipe(fds) == 0) {
@@ -98,11 +92,6 @@ void sleep_long() {
         main_thread_sleep(10000000);
 }
 
-void interrupted_sleep() {
-    start_thread(interrupt_main);
-    sleep_long();
-}
-
 /// A signal that comes while the main thread works waits for the next sleep.
 void interrupted_work() {
     raise(SIGTSTP);
@@ -120,26 +109,14 @@ void broken_pipe_elsewhere() {
     sleep_long();
 }
 
-/// In follow mode an idle run sees that nobody reads its output any more.
-void reader_of_output_gone() {
-    int fds[2];
-    if (pipe(fds) != 0 || dup2(fds[1], STDOUT_FILENO) < 0)
-        return;
-    close(fds[1]);
-    anchor.bFollow = 1;
-    main_thread_sleep(1000); // nothing yet
-    close(fds[0]);
-    main_thread_sleep(10000000);
-}
-
 TEST(Signals, TerminatingSignalsJumpOnlyWhereTheMainThreadWaits) {
     const struct {
         void (*body)();
         int signo;
     } cases[] = {
-        {interrupted_sleep, SIGINT},      {interrupted_work, SIGTSTP},
-        {interrupted_record, SIGQUIT},    {broken_pipe_elsewhere, SIGPIPE},
-        {reader_of_output_gone, SIGPIPE},
+        {interrupted_work, SIGTSTP},
+        {interrupted_record, SIGQUIT},
+        {broken_pipe_elsewhere, SIGPIPE},
     };
     GTEST_FLAG_SET(death_test_style, "threadsafe");
     for (const auto& [body, signo] : cases)

@@ -56,6 +56,8 @@ settings parse(const char* pText) {
 TEST_F(Start, argument_counts_records_or_seconds_from_either_end) {
     EXPECT_EQ(parse("+3r"), (settings{START_RECORD_FROM_BEGIN, -9, -9, 3}));
     EXPECT_EQ(parse(" \t\n\v\f\r+10s"), (settings{START_SECONDS_FROM_BEGIN, 10, 0, -9}));
+    EXPECT_EQ(parse("+ 3r"), (settings{START_RECORD_FROM_BEGIN, -9, -9, 3}));
+    EXPECT_EQ(parse("+-3r"), (settings{START_RECORD_FROM_BEGIN, -9, -9, -3}));
     EXPECT_EQ(parse("-5r"), (settings{START_RECORDS_FROM_END, -9, -9, 5}));
     EXPECT_EQ(parse("- -5s"), (settings{START_SECONDS_FROM_END, -5, 0, -9}));
     EXPECT_EQ(parse("+99999999999r"), (settings{START_RECORD_FROM_BEGIN, -9, -9, INT32_MAX}));
@@ -65,7 +67,7 @@ TEST_F(Start, argument_counts_records_or_seconds_from_either_end) {
 
 TEST_F(Start, argument_is_a_date_and_time) {
     constexpr int32_t NOON = 919598400; // in UTC
-    EXPECT_EQ(parse("02/21/99 12:00:00"), (settings{START_TIME, NOON, 0, -9}));
+    EXPECT_EQ(parse(" 02/21/99 \t 12:00:00"), (settings{START_TIME, NOON, 0, -9}));
     EXPECT_EQ(parse("02/21/99 12:00:00.25"), (settings{START_TIME, NOON, 250'000'000, -9}));
     EXPECT_EQ(parse("02/21/99 12:00:00.000001"), (settings{START_TIME, NOON, 1000, -9}));
     EXPECT_EQ(parse("02/21/99 12:00:00."), (settings{START_TIME, NOON, 0, -9}));
@@ -98,10 +100,10 @@ TEST_F(Start, argument_that_is_neither_is_refused) {
         std::vector<const char*> texts;
         const char* pMessage;
     } cases[] = {
-        {{"+5", "+5rs", "+r", "-", "+5 r", "+5R", "+s5", "-5r "},
+        {{"+5", "+5rs", "+r", "-", "+5 r", "+5R", "+s5", "-5r ", "+5.5s", "+x5r"},
          "kelvo: 2625-153 Delta start time or record number is invalid.\n\n"},
         {{"02/21/99", "02/21/99 ", "x", "12:00", "25:00:00", "12:00:00.25x", "12:00:00.5 ",
-          "12:00:00.-5", "13/13/99 12:00:00"},
+          "12:00:00.-5", "12:00:00. 5", "13/13/99 12:00:00", "21.02.1999 12:00:00"},
          "kelvo: 2625-154 Start time is invalid.\n\n"},
     };
     for (const auto& test : cases)

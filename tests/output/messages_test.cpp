@@ -5,18 +5,13 @@
 #include "kelvo.h"
 #include "print.h"
 #include "stdout_stream.h"
-#include "usage.h"
 
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <cerrno>
 #include <string>
 #include <thread>
 
-using testing::EndsWith;
-using testing::HasSubstr;
-using testing::StartsWith;
 using testing::internal::CaptureStderr;
 using testing::internal::CaptureStdout;
 using testing::internal::GetCapturedStderr;
@@ -51,16 +46,6 @@ TEST(Messages, AreCutAndReplacedOnStandardOutput) {
     const char* volatile pRefused = "%2147483648d"; // the compiler would warn of it
     output_printf(pRefused, 1);
     EXPECT_EQ(flushed_stdout(), std::string(4095, 'a') + "kelvo error in output_vprintf()");
-}
-
-TEST(Usage, IsWrittenAsItStands) {
-    CaptureStdout();
-    output_usage();
-    const std::string text = flushed_stdout();
-    EXPECT_THAT(text, StartsWith("kelvo [-fhbrl] [-o <dtic>] [-t <templatepath>]\n"
-                                 "      [-s \"<start time>\"] filename ...\n\nwhere:\n\n"));
-    EXPECT_THAT(text, HasSubstr("      c Component id (e.g.\"_ZPB\")\n"));
-    EXPECT_THAT(text, EndsWith("records from the beginning (+) or end (-) of the file.\n"));
 }
 
 // Texts of another thread wait for the main thread, in order, and end a record

@@ -71,21 +71,6 @@ TEST(StdoutStream, LosesNothingOnASlowPipeThatDoesNotBlock) {
     EXPECT_TRUE(received == expected);
 }
 
-TEST(StdoutStream, RemembersTheFirstErrorAndDropsTheRest) {
-    const int full = open("/dev/full", O_WRONLY);
-    ASSERT_GE(full, 0);
-    const stdout_on output(full);
-    stdout_write("lost");
-    stdout_flush();
-    EXPECT_EQ(stdout_error(), ENOSPC);
-    close(STDOUT_FILENO);
-    stdout_write(std::string(200000, 'x'));
-    stdout_flush();
-    EXPECT_EQ(stdout_error(), ENOSPC);
-    EXPECT_TRUE(stdout_is_empty());
-    close(full);
-}
-
 // A child in the background of a terminal that stops background output: its
 // first write is refused with SIGTTOU, which its handler only notes. Lines must
 // then still appear, each when it is complete.

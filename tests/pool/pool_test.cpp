@@ -1,5 +1,5 @@
 // The pool never opens again once it is closed, so each case runs in a process
-// of its own; what it writes to standard error is read back through a file.
+// of its own.
 #include "pool.h"
 
 #include "kelvo.h"
@@ -7,17 +7,16 @@
 #include <array>
 #include <cerrno>
 #include <condition_variable>
-#include <cstdio>
 #include <cstdlib>
 #include <mutex>
-#include <string>
-#include <unistd.h>
 #include <vector>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 using testing::HasSubstr;
+using testing::internal::CaptureStderr;
+using testing::internal::GetCapturedStderr;
 
 namespace {
 
@@ -85,32 +84,6 @@ void* pass_gate(void* pTask) {
     return nullptr;
 }
 
-/// Standard error goes to a file while the object lives.
-class stderr_file {
-public:
-    stderr_file() : m_saved(dup(STDERR_FILENO)) {
-        dup2(fileno(m_pFile), STDERR_FILENO);
-    }
-    ~stderr_file() {
-        dup2(m_saved, STDERR_FILENO);
-        close(m_saved);
-        fclose(m_pFile);
-    }
-    stderr_file(const stderr_file&) = delete;
-    stderr_file& operator=(const stderr_file&) = delete;
-
-    std::string text() const {
-        std::string sText(65536, '\0');
-        const ssize_t length = pread(fileno(m_pFile), sText.data(), sText.size(), 0);
-        sText.resize(length > 0 ? static_cast<size_t>(length) : 0);
-        return sText;
-    }
-
-private:
-    FILE* m_pFile = tmpfile();
-    int m_saved;
-};
-
 std::array<std::atomic<pthread_t>, 64> ids;
 std::array<int, 64> tasks;
 
@@ -125,19 +98,21 @@ void start_pool() {
 }
 
 void grows_when_fewer_than_three_are_free() {
-    const stderr_file errors;
+    CaptureStderr();
     memory_is_restricted = 1;
     start_pool();
     for (size_t uTask = 0; uTask < 14; ++uTask) {
         ASSERT_EQ(add_task(uTask), 0);
         gate.wait_for_entered(uTask + 1);
     }
-    EXPECT_EQ(errors.text(), "[POOL]Total: 000000    Free: 000000 |  Adding Threads\n"
-                             "[POOL] Total: 000016    Free: 000016 |  Aifter adding Threads\n");
+    EXPECT_EQ(GetCapturedStderr(),
+              "[POOL]Total: 000000    Free: 000000 |  Adding Threads\n"
+              "[POOL] Total: 000016    Free: 000016 |  Aifter adding Threads\n");
+    CaptureStderr();
     ASSERT_EQ(add_task(14), 0);
     gate.wait_for_entered(15);
     EXPECT_THAT(
-        errors.text(),
+        GetCapturedStderr(),
         testing::EndsWith("[POOL]Total: 000016    Free: 000002 |  Adding Threads\n"
                           "[POOL] Total: 000020    Free: 000006 |  Aifter adding Threads\n"));
     EXPECT_TRUE(gate.bAsynchronousBlocked);
@@ -159,13 +134,13 @@ TEST(Pool, GrowsWhenFewerThanThreeAreFree) {
 
 /// With one thread in all, tasks cannot overtake one another.
 void runs_tasks_in_order() {
-    const stderr_file errors;
+    CaptureStderr();
     iThreadsAllowed = 1;
     start_pool();
     EXPECT_EQ(totalThrdsInPool.load(), 1U);
     iThreadsAllowed = 0;
     EXPECT_EQ(add_task(0), -1) << "refused although a thread is free";
-    EXPECT_THAT(errors.text(),
+    EXPECT_THAT(GetCapturedStderr(),
                 HasSubstr("WARNING: Insufficient memory (size=0) to process: pthread_create\n"));
 
     totalFreeThrdsInPool += 1000; // so that nothing is added from here on
@@ -185,7 +160,6 @@ TEST(Pool, RunsTasksInOrder) {
 }
 
 void closing_drops_what_has_not_begun() {
-    const stderr_file errors;
     iThreadsAllowed = 3;
     start_pool();
     totalFreeThrdsInPool += 1000; // nothing is added: three tasks run, the others wait
@@ -213,7 +187,6 @@ TEST(Pool, ClosingDropsWhatHasNotBegun) {
 /// None of the tasks ends before all have begun: each needs a thread of its own,
 /// however few threads have woken up when the next one comes.
 void every_task_gets_a_thread() {
-    const stderr_file errors;
     iThreadsAllowed = 1000;
     start_pool();
     for (size_t uTask = 0; uTask < tasks.size(); ++uTask)
@@ -226,53 +199,6 @@ void every_task_gets_a_thread() {
 
 TEST(Pool, EveryTaskGetsAThreadOfItsOwn) {
     IN_OWN_PROCESS(every_task_gets_a_thread);
-}
-
-void no_thread_at_all() {
-    const stderr_file errors;
-    iThreadsAllowed = 0;
-    EXPECT_EQ(startNewThreadPool(), -1);
-    EXPECT_TRUE(endThrdPool());
-}
-
-TEST(Pool, StartFailsWithoutAnyThread) {
-    IN_OWN_PROCESS(no_thread_at_all);
-}
-
-void never_started() {
-    EXPECT_TRUE(endThrdPool());
-    EXPECT_TRUE(endThrdPool());
-}
-
-TEST(Pool, EndIsHarmlessWhenNeverStarted) {
-    IN_OWN_PROCESS(never_started);
-}
-
-/// Every task runs exactly once while several threads add tasks, among them
-/// pool threads, as readers do.
-std::atomic<int> iRuns{0};
-
-void* add_next_task(void* pTask) {
-    const size_t uTask = static_cast<size_t>(static_cast<int*>(pTask) - tasks.data());
-    ++iRuns;
-    if (uTask + 8 < tasks.size() && add_task(uTask + 8) != 0)
-        abort();
-    return nullptr;
-}
-
-void tasks_add_tasks() {
-    start_pool();
-    pool_task_main = add_next_task;
-    for (size_t uTask = 0; uTask < 8; ++uTask)
-        ASSERT_EQ(add_task(uTask), 0);
-    while (static_cast<size_t>(iRuns.load()) < tasks.size())
-        usleep(100);
-    EXPECT_TRUE(endThrdPool());
-    EXPECT_EQ(static_cast<size_t>(iRuns.load()), tasks.size());
-}
-
-TEST(Pool, TasksMayAddTasks) {
-    IN_OWN_PROCESS(tasks_add_tasks);
 }
 
 } // namespace
