@@ -19,15 +19,13 @@
 namespace {
 
 /// Variables of the tester's environment that would change the result.
-constexpr std::string_view DROPPED_PREFIXES[] = {
-    "LC_",
-    "LANG",
-    "TZ=",
-    "NLSPATH=",
-    "KV_TR_TEMPLATE_PATH=",
-    "KELVO_USE_LOWMEM=",
-    "POSIXLY_CORRECT=",
-};
+constexpr std::string_view DROPPED_PREFIXES[] = {"LC_",
+                                                 "LANG",
+                                                 "TZ=",
+                                                 "NLSPATH=",
+                                                 "KV_TR_TEMPLATE_PATH=",
+                                                 "KELVO_USE_LOWMEM=",
+                                                 "POSIXLY_CORRECT="};
 
 int64_t now_ms() {
     using namespace std::chrono;
@@ -54,6 +52,7 @@ std::vector<std::string> make_environment(const command_setup& setup) {
             result.emplace_back(*ppVariable);
     set("LC_ALL=C");
     set("TZ=UTC0");
+    set(sanitizer_option("TSAN_OPTIONS", ""));
     for (const std::string& sVariable : setup.environment)
         set(sVariable);
     return result;
@@ -265,4 +264,26 @@ command_result live_command::wait() {
 
 command_result run_command(const std::vector<std::string>& arguments, const command_setup& setup) {
     return live_command(arguments, setup).wait();
+}
+
+uint64_t setting(const char* pName, uint64_t uDefault) {
+    const char* const pValue = getenv(pName);
+    return pValue != nullptr && *pValue != '\0' ? strtoull(pValue, nullptr, 10) : uDefault;
+}
+
+bool is_locked(const std::string& sPath) {
+    const int fd = open(sPath.c_str(), O_RDWR | O_CLOEXEC);
+    struct flock lock {};
+    lock.l_type = F_WRLCK;
+    lock.l_whence = SEEK_SET;
+    EXPECT_EQ(fcntl(fd, F_GETLK, &lock), 0);
+    close(fd);
+    return lock.l_type != F_UNLCK;
+}
+
+std::string sanitizer_option(const std::string& sName, const std::string& sOption) {
+    const char* const pInForce = getenv(sName.c_str());
+    std::string sVariable = sName + '=' + (pInForce != nullptr ? pInForce : "") + ':' + sOption;
+    // Otherwise each run of a thread sanitizer's program sleeps for a second at its end.
+    return sName == "TSAN_OPTIONS" ? sVariable + ":atexit_sleep_ms=0" : sVariable;
 }

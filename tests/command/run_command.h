@@ -86,3 +86,12 @@ private:
 /// Runs the program to its end.
 command_result run_command(const std::vector<std::string>& arguments,
                            const command_setup& setup = {});
+
+/// A number from the environment, for runs longer than the usual ones.
+uint64_t setting(const char* pName, uint64_t uDefault);
+
+/// Whether another process holds a lock on the file.
+bool is_locked(const std::string& sPath);
+
+/// "NAME=value" that adds an option to those of a sanitizer that are in force.
+std::string sanitizer_option(const std::string& sName, const std::string& sOption);

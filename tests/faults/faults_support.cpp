@@ -81,21 +81,9 @@ void expect_counted(const command_result& result) {
 
 } // namespace
 
-uint64_t setting(const char* pName, uint64_t uDefault) {
-    const char* const pValue = getenv(pName);
-    return pValue != nullptr && *pValue != '\0' ? strtoull(pValue, nullptr, 10) : uDefault;
-}
-
-std::string sanitizer_option(const std::string& sName, const std::string& sOption) {
-    const char* const pInForce = getenv(sName.c_str());
-    return sName + '=' + (pInForce != nullptr ? std::string(pInForce) + ':' : "") + sOption;
-}
-
 command_setup failing_setup(const std::vector<std::string>& variables) {
     command_setup setup;
     setup.environment = variables;
-    // A second per run, in which a thread that is on its way out might race.
-    setup.environment.push_back(sanitizer_option("TSAN_OPTIONS", "atexit_sleep_ms=0"));
 #ifdef KELVO_SANITIZED
     setup.sProgram = KELVO_FAILING_PROGRAM;
 #else

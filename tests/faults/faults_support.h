@@ -18,12 +18,6 @@ inline constexpr bool SANITIZED = true;
 inline constexpr bool SANITIZED = false;
 #endif
 
-/// A number from the environment, for runs larger than the usual ones.
-uint64_t setting(const char* pName, uint64_t uDefault);
-
-/// "NAME=value" that adds an option to those of a sanitizer that are in force.
-std::string sanitizer_option(const std::string& sName, const std::string& sOption);
-
 /// The command with the calls of failing_calls.cpp, of which those fail that
 /// the variables say.
 command_setup failing_setup(const std::vector<std::string>& variables);

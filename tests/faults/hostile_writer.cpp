@@ -28,28 +28,25 @@ uint32_t random_below(size_t uEnd) {
     return static_cast<uint32_t>(random_numbers() % uEnd);
 }
 
-constexpr uint32_t HEADER_WORDS[] = {
-    offsetof(trace_file_header, uProperties),
-    offsetof(trace_file_header, uFlags),
-    offsetof(trace_file_header, uOffset),
-    offsetof(trace_file_header, uSeqLock),
-    offsetof(trace_file_header, uTailReq),
-    offsetof(trace_file_header, uActualFileSize),
-    offsetof(trace_file_header, timeInfo),
-    offsetof(trace_file_header, uOldestRecordOffset),
-    offsetof(trace_file_header, uOldestRecordOffset),
-    offsetof(trace_file_header, uOldestRecordOffset),
-    offsetof(trace_file_header, program),
-    offsetof(trace_file_header, tz_offset),
-};
+constexpr uint32_t HEADER_WORDS[] = {offsetof(trace_file_header, uProperties),
+                                     offsetof(trace_file_header, uFlags),
+                                     offsetof(trace_file_header, uOffset),
+                                     offsetof(trace_file_header, uSeqLock),
+                                     offsetof(trace_file_header, uTailReq),
+                                     offsetof(trace_file_header, uActualFileSize),
+                                     offsetof(trace_file_header, timeInfo),
+                                     offsetof(trace_file_header, uOldestRecordOffset),
+                                     offsetof(trace_file_header, uOldestRecordOffset),
+                                     offsetof(trace_file_header, uOldestRecordOffset),
+                                     offsetof(trace_file_header, program),
+                                     offsetof(trace_file_header, tz_offset)};
 
 constexpr uint32_t RECORD_WORDS[] = {
     offsetof(trace_record_header, length),    offsetof(trace_record_header, length),
     offsetof(trace_record_header, length),    offsetof(trace_record_header, function),
     offsetof(trace_record_header, function),  offsetof(trace_record_header, seqNumber),
     offsetof(trace_record_header, compId),    offsetof(trace_record_header, threadId),
-    offsetof(trace_record_header, timeStamp), offsetof(trace_record_header, timeStamp) + 4,
-};
+    offsetof(trace_record_header, timeStamp), offsetof(trace_record_header, timeStamp) + 4};
 
 class victim {
 public:
@@ -115,28 +112,26 @@ private:
     }
 
     uint32_t bad_value(uint32_t uAt) {
-        const uint32_t values[] = {
-            0,
-            1,
-            27,
-            28,
-            29,
-            36,
-            m_size - 1,
-            m_size,
-            m_size + 1,
-            m_size - 28,
-            m_size - uAt,
-            0x7FFFFFFF,
-            0x80000000,
-            0xFFFFFFFE,
-            0xFFFFFFFF,
-            0xFFF,
-            some_record(),
-            random_below(m_size),
-            random_below(20),
-            random_below(0x100000000),
-        };
+        const uint32_t values[] = {0,
+                                   1,
+                                   27,
+                                   28,
+                                   29,
+                                   36,
+                                   m_size - 1,
+                                   m_size,
+                                   m_size + 1,
+                                   m_size - 28,
+                                   m_size - uAt,
+                                   0x7FFFFFFF,
+                                   0x80000000,
+                                   0xFFFFFFFE,
+                                   0xFFFFFFFF,
+                                   0xFFF,
+                                   some_record(),
+                                   random_below(m_size),
+                                   random_below(20),
+                                   random_below(0x100000000)};
         return values[random_below(std::size(values))];
     }
 

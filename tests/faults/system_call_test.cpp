@@ -3,9 +3,10 @@
 // Skipped where strace is not installed or processes may not be traced.
 #include "faults_support.h"
 
+#include <csignal>
 #include <fstream>
 #include <map>
-#include <sstream>
+#include <unistd.h>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -22,8 +23,8 @@ using testing::HasSubstr;
 command_setup traced_setup() {
     command_setup setup;
     setup.sProgram = KELVO_STRACE;
-    setup.environment = {sanitizer_option("ASAN_OPTIONS", "detect_leaks=0"),
-                         sanitizer_option("TSAN_OPTIONS", "atexit_sleep_ms=0")};
+    setup.environment = {sanitizer_option("ASAN_OPTIONS", "detect_leaks=0:handle_sigbus=0"),
+                         sanitizer_option("TSAN_OPTIONS", "handle_sigbus=0")};
     return setup;
 }
 
@@ -64,88 +65,48 @@ struct failing_call {
     const char* pCall;
     const char* pError;
     int iWhen; ///< its number among the calls on that file, per thread
-    bool bTemplate = false;
     part whole = part::BOTH_FILES;
     int status = 0;
     const char* pOut = ""; ///< what standard output contains
     const char* pErr = ""; ///< what standard error is; the name of the first file for "FILE"
+    bool bTemplate = false;
     std::vector<std::string> options{};
 };
 
+constexpr char STAT[] = "?fstat,?newfstatat,?statx";
+constexpr char IN_USE[] = "2625-161 Trace file \"FILE\" is already in use.\n";
+constexpr char MARKER[] = "\t[INSUFFICIENT MEMORY TO PROCESS]\n";
+constexpr char NO_MEMORY[] = "WARNING: Insufficient memory (size=1048576) to process: FILE\n"
+                             "Total insufficient memory warning messages: 1\n"
+                             "Total insufficient memory warning messages during file open: 1\n";
+constexpr char NOT_MAPPED[] = "2625-180 Either file permissions are too restrictive, or the trace "
+                              "file must be copied outside of NFS to be used.\n ";
+
+// A second time on the file: when its turn to be read has come.
 const failing_call FAILING_CALLS[] = {
-    {.pCall = "?access,?faccessat",
-     .pError = "EACCES",
-     .iWhen = 1,
-     .whole = part::NOTHING,
-     .status = 1,
-     .pErr = "2625-101 Filename \"FILE\" is not accessible, Permission denied\n"},
-    {.pCall = "openat",
-     .pError = "EMFILE",
-     .iWhen = 1,
-     .whole = part::SECOND_FILE,
-     .status = 1,
-     .pErr = "2625-102 Error opening file \"FILE\", Too many open files\n"},
-    {.pCall = "openat", // when its turn to be read has come
-     .pError = "ENOENT",
-     .iWhen = 2,
-     .whole = part::SECOND_FILE,
-     .pErr = "2625-102 Error opening file \"FILE\", No such file or directory\n"},
-    {.pCall = "fcntl",
-     .pError = "EAGAIN",
-     .iWhen = 1,
-     .whole = part::SECOND_FILE,
-     .status = 1,
-     .pOut = "2625-161 Trace file \"FILE\" is already in use.\n"},
-    {.pCall = "fcntl",
-     .pError = "EACCES",
-     .iWhen = 2,
-     .whole = part::SECOND_FILE,
-     .pOut = "2625-161 Trace file \"FILE\" is already in use.\n"},
-    {.pCall = "fcntl",
-     .pError = "ENOLCK",
-     .iWhen = 1,
-     .whole = part::SECOND_FILE,
-     .status = 1,
-     .pErr = "2625-162 Error returned from fcntl() attempting to lock trace file,  No locks "
-             "available\n"},
-    {.pCall = "?fstat,?newfstatat,?statx",
-     .pError = "EIO",
-     .iWhen = 1,
-     .whole = part::SECOND_FILE,
-     .status = 1,
-     .pErr = "2625-104 Error retrieving information about file \"FILE\",  Input/output error\n"},
-    {.pCall = "mmap",
-     .pError = "ENOMEM",
-     .iWhen = 1,
-     .whole = part::SECOND_FILE,
-     .status = 1,
-     .pOut = "\t[INSUFFICIENT MEMORY TO PROCESS]\n",
-     .pErr = "WARNING: Insufficient memory (size=1048576) to process: FILE\n"
-             "Total insufficient memory warning messages: 1\n"
-             "Total insufficient memory warning messages during file open: 1\n"},
-    {.pCall = "mmap",
-     .pError = "EAGAIN",
-     .iWhen = 2,
-     .whole = part::SECOND_FILE,
-     .pOut = "\t[INSUFFICIENT MEMORY TO PROCESS]\n",
-     .pErr = "WARNING: Insufficient memory (size=1048576) to process: FILE\n"
-             "Total insufficient memory warning messages: 1\n"
-             "Total insufficient memory warning messages during file open: 1\n"},
-    {.pCall = "mmap",
-     .pError = "EACCES",
-     .iWhen = 1,
-     .whole = part::SECOND_FILE,
-     .status = 1,
-     .pOut = "2625-180 Either file permissions are too restrictive, or the trace file must be "
-             "copied outside of NFS to be used.\n "},
-    {.pCall = "close", .pError = "EIO", .iWhen = 1},
-    {.pCall = "close", .pError = "EINTR", .iWhen = 1},
-    {.pCall = "utimensat", .pError = "EPERM", .iWhen = 1},
-    {.pCall = "openat", .pError = "EMFILE", .iWhen = 1, .bTemplate = true},
-    {.pCall = "openat", .pError = "EACCES", .iWhen = 1, .bTemplate = true, .options = {"-l"}},
-    {.pCall = "?fstat,?newfstatat,?statx", .pError = "EIO", .iWhen = 1, .bTemplate = true},
-    {.pCall = "read", .pError = "EIO", .iWhen = 1, .bTemplate = true},
-    {.pCall = "read", .pError = "EINTR", .iWhen = 1, .bTemplate = true, .options = {"-l"}},
+    {"?access,?faccessat", "EACCES", 1, part::NOTHING, 1, "",
+     "2625-101 Filename \"FILE\" is not accessible, Permission denied\n"},
+    {"openat", "EMFILE", 1, part::SECOND_FILE, 1, "",
+     "2625-102 Error opening file \"FILE\", Too many open files\n"},
+    {"openat", "ENOENT", 2, part::SECOND_FILE, 0, "",
+     "2625-102 Error opening file \"FILE\", No such file or directory\n"},
+    {"fcntl", "EAGAIN", 1, part::SECOND_FILE, 1, IN_USE},
+    {"fcntl", "EACCES", 2, part::SECOND_FILE, 0, IN_USE},
+    {"fcntl", "ENOLCK", 1, part::SECOND_FILE, 1, "",
+     "2625-162 Error returned from fcntl() attempting to lock trace file,  No locks available\n"},
+    {STAT, "EIO", 1, part::SECOND_FILE, 1, "",
+     "2625-104 Error retrieving information about file \"FILE\",  Input/output error\n"},
+    {"mmap", "ENOMEM", 1, part::SECOND_FILE, 1, MARKER, NO_MEMORY},
+    {"mmap", "EAGAIN", 2, part::SECOND_FILE, 0, MARKER, NO_MEMORY},
+    {"mmap", "EACCES", 1, part::SECOND_FILE, 1, NOT_MAPPED},
+    {"close", "EIO", 1},
+    {"close", "EINTR", 1},
+    {"utimensat", "EPERM", 1},
+    {"openat", "EMFILE", 1, part::BOTH_FILES, 0, "", "", true},
+    {"openat", "EACCES", 1, part::BOTH_FILES, 0, "", "", true, {"-l"}},
+    {STAT, "EIO", 1, part::BOTH_FILES, 0, "", "", true},
+    {"read", "EIO", 1, part::BOTH_FILES, 0, "", "", true},
+    {"read", "EINTR", 1, part::BOTH_FILES, 0, "", "", true, {"-l"}},
 };
 
 std::string with_name(std::string sText, const std::string& sName) {
@@ -171,13 +132,14 @@ TEST_F(SystemCall, OnAFileMayFail) {
         [](size_t uCase, const fault_sample& sample) {
             const failing_call& call = FAILING_CALLS[uCase];
             const std::string sCall = call.pCall;
+            const std::string sFile = call.bTemplate ? sample.template_file() : sample.file(0);
             std::vector<std::string> arguments = {
                 "-f",
                 "-qq",
                 "-o",
                 log_of(sample),
                 "-P",
-                call.bTemplate ? sample.template_file() : sample.file(0),
+                sFile,
                 "-e",
                 "trace=openat,close," + sCall,
                 "-e",
@@ -210,51 +172,57 @@ TEST_F(SystemCall, OnAFileMayFail) {
 
 // ---------------------------------------------------- calls, counted over all
 
-constexpr size_t TIMES = 5;
-
 /// A call that fails once: the first, then in the next run the second, and so on,
-/// counted from the beginning of the program itself, in each thread.
+/// counted from the beginning of the program itself, in each thread. munmap is
+/// tried on the two files alone: the C library itself ends a process that cannot
+/// release the stack of a thread.
 struct counted_call {
     const char* pCall;
-    const char* pError;
-    size_t uTimes = TIMES;
-    bool bMainThreadOnly = false;
+    std::vector<const char*> errors;
 };
 
-// munmap is tried on the two files alone: the C library itself ends a process
-// that cannot release the stack of a thread.
-constexpr counted_call COUNTED_CALLS[] = {
-    {"mmap", "ENOMEM"},
-    {"munmap", "ENOMEM", 2, true},
-    {"mprotect", "ENOMEM"},
-    {"brk", "ENOMEM"},
-    {"clone3", "EAGAIN"},
-    {"rt_sigprocmask", "EINVAL"},
-    {"rt_sigaction", "EINVAL"},
-    {"write", "ENOSPC"},
-    {"write", "EINTR"},
-    {"write", "EAGAIN"},
-    {"write", "EIO"},
-    {"ppoll", "EINTR"},
-    {"ppoll", "ENOMEM"},
-    {"poll", "EINTR"},
-    {"clock_nanosleep", "EINTR"},
-    {"getcwd", "ENOENT"},
-    {"getdents64", "EIO"},
-    {"newfstatat", "EIO"},
-    {"lseek", "ESPIPE"},
-    {"ioctl", "ENOTTY"},
-    {"openat", "EMFILE"},
-    {"openat", "ENFILE"},
-    {"openat", "EINTR"},
-    {"close", "EINTR"},
-    {"fcntl", "EINTR"},
-    {"utimensat", "EROFS"},
-    {"read", "EIO"},
-    {"sched_yield", "EINVAL"},
-    {"madvise", "EINVAL"},
-    {"prctl", "EINVAL"},
+const counted_call COUNTED_CALLS[] = {
+    {"mmap", {"ENOMEM"}},
+    {"munmap", {"ENOMEM"}},
+    {"mprotect", {"ENOMEM"}},
+    {"brk", {"ENOMEM"}},
+    {"clone3", {"EAGAIN"}},
+    {"rt_sigprocmask", {"EINVAL"}},
+    {"rt_sigaction", {"EINVAL"}},
+    {"write", {"ENOSPC", "EINTR", "EAGAIN", "EIO"}},
+    {"ppoll", {"EINTR", "ENOMEM"}},
+    {"poll", {"EINTR"}},
+    {"clock_nanosleep", {"EINTR"}},
+    {"getcwd", {"ENOENT"}},
+    {"getdents64", {"EIO"}},
+    {"newfstatat", {"EIO"}},
+    {"lseek", {"ESPIPE"}},
+    {"ioctl", {"ENOTTY"}},
+    {"openat", {"EMFILE", "ENFILE", "EINTR"}},
+    {"close", {"EINTR"}},
+    {"fcntl", {"EINTR"}},
+    {"utimensat", {"EROFS"}},
+    {"read", {"EIO"}},
+    {"sched_yield", {"EINVAL"}},
+    {"madvise", {"EINVAL"}},
+    {"prctl", {"EINVAL"}},
 };
+
+struct counted_run {
+    std::string sCall;
+    std::string sError;
+    size_t uNumber;
+};
+
+std::vector<counted_run> counted_runs() {
+    std::vector<counted_run> runs;
+    for (const auto& [pCall, errors] : COUNTED_CALLS)
+        for (const char* const pError : errors)
+            for (size_t uNumber = 1; uNumber <= (pCall == std::string("munmap") ? 2U : 5U);
+                 ++uNumber)
+                runs.push_back({pCall, pError, uNumber});
+    return runs;
+}
 
 std::string all_calls() {
     std::string sCalls;
@@ -291,39 +259,57 @@ TEST_F(SystemCall, MayFailOnce) {
     if (SANITIZED)
         GTEST_SKIP() << "a sanitizer makes such calls itself and cannot do without";
     std::map<std::string, size_t> before = calls_before_main();
-    std::vector<std::pair<counted_call, size_t>> runs;
-    for (const counted_call& call : COUNTED_CALLS)
-        for (size_t uNumber = 1; uNumber <= call.uTimes; ++uNumber)
-            runs.emplace_back(call, uNumber);
+    const std::vector<counted_run> runs = counted_runs();
     fault_sweep{}.sweep(
         runs.size(),
         [&](size_t uRun, const fault_sample& sample) {
-            const auto& [call, uNumber] = runs[uRun];
-            const size_t uWhen = before[call.pCall] + uNumber;
-            const std::string sCall = std::string("?") + call.pCall;
-            std::vector<std::string> arguments = {"-qq", "-o", "/dev/null"};
-            if (!call.bMainThreadOnly)
+            const auto& [sCall, sError, uNumber] = runs[uRun];
+            const std::string sWhen = std::to_string(before[sCall] + uNumber);
+            std::vector<std::string> arguments = {"-qq",
+                                                  "-o",
+                                                  "/dev/null",
+                                                  "-e",
+                                                  "trace=?" + sCall,
+                                                  "-e",
+                                                  "inject=?" + sCall + ":error=" + sError +
+                                                      ":when=" + sWhen};
+            if (sCall != "munmap")
                 arguments.push_back("-f");
-            const std::string sInjection =
-                sCall + ":error=" + call.pError + ":when=" + std::to_string(uWhen);
-            arguments.insert(arguments.end(),
-                             {"-e", "trace=" + sCall, "-e", "inject=" + sInjection, KELVO_PROGRAM});
+            arguments.push_back(KELVO_PROGRAM);
             for (std::string& sArgument : counted_arguments(sample, uRun % 2 == 0))
                 arguments.push_back(std::move(sArgument));
             return fault_sweep::run{std::move(arguments), traced_setup()};
         },
         [&](size_t uRun, const fault_sample& sample, const command_result& result) {
-            const auto& [call, uNumber] = runs[uRun];
-            SCOPED_TRACE(std::string(call.pCall) + " " + call.pError + " " +
-                         std::to_string(uNumber));
+            const auto& [sCall, sError, uNumber] = runs[uRun];
+            SCOPED_TRACE(sCall + " " + sError + " " + std::to_string(uNumber));
             sample.expect_honest(result);
-            const std::string sError = call.pError;
-            if (sError == "EINTR" && std::string(call.pCall) != "openat" &&
-                std::string(call.pCall) != "fcntl") {
+            if (sError == "EINTR" && sCall != "openat" && sCall != "fcntl") {
                 EXPECT_TRUE(sample.is_whole(0, result.sOut) && sample.is_whole(1, result.sOut));
                 EXPECT_EQ(result.status, 0);
             }
         });
+}
+
+/// The main thread looks into a mapping when it opens the file, and only then:
+/// it comes back from mapping to a file that has no pages any more.
+TEST_F(SystemCall, AFileMayShrinkWhileItIsOpened) {
+    for (const char* const pOption : {"-r", "-f", "-B"}) {
+        const fault_sample sample;
+        command_setup setup = traced_setup();
+        setup.sDirectory = sample.directory(); // for a core file
+        live_command kelvo({"-f", "-qq", "-o", log_of(sample), "-P", sample.file(0), "-e",
+                            "trace=mmap", "-e", "inject=mmap:delay_exit=1500000:when=1",
+                            KELVO_PROGRAM, pOption, sample.file(0), sample.file(1)},
+                           setup);
+        for (int i = 0; i < 60'000 && !is_locked(sample.file(0)); ++i)
+            usleep(1000);
+        usleep(300'000); // it is mapped right after it is locked
+        ASSERT_EQ(truncate(sample.file(0).c_str(), 0), 0);
+        const command_result result = kelvo.wait();
+        EXPECT_EQ(result.signo, SIGBUS) << pOption << '\n' << result.sErr;
+        EXPECT_EQ(result.sErr, "");
+    }
 }
 
 /// A trace file that got the number of a closed standard output would be printed

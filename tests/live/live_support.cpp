@@ -2,11 +2,8 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <cstdlib>
-#include <fcntl.h>
 #include <ostream>
 #include <sstream>
-#include <unistd.h>
 
 #include <gtest/gtest.h>
 
@@ -28,26 +25,11 @@ bool is_summary(std::string_view sLine) {
 
 } // namespace
 
-uint64_t setting(const char* pName, uint64_t uDefault) {
-    const char* const pValue = getenv(pName);
-    return pValue != nullptr && *pValue != '\0' ? strtoull(pValue, nullptr, 10) : uDefault;
-}
-
 command_setup live_writer_setup() {
     command_setup setup;
     setup.sProgram = KELVO_LIVE_WRITER;
     setup.timeoutSeconds = 600;
     return setup;
-}
-
-bool is_locked(const std::string& sPath) {
-    const int fd = open(sPath.c_str(), O_RDWR | O_CLOEXEC);
-    struct flock lock {};
-    lock.l_type = F_WRLCK;
-    lock.l_whence = SEEK_SET;
-    EXPECT_EQ(fcntl(fd, F_GETLK, &lock), 0);
-    close(fd);
-    return lock.l_type != F_UNLCK;
 }
 
 void PrintTo(const number_range& range, std::ostream* pOut) {

@@ -12,14 +12,8 @@
 #include <string_view>
 #include <vector>
 
-/// A number from the environment, for runs longer than the usual ones.
-uint64_t setting(const char* pName, uint64_t uDefault);
-
 /// live_writer with these arguments, which see live_writer.cpp.
 command_setup live_writer_setup();
-
-/// Whether another process holds a lock on the file.
-bool is_locked(const std::string& sPath);
 
 /// Numbers from uFirst to uLast.
 struct number_range {
