@@ -22,7 +22,7 @@ namespace {
 
 struct failing_kind {
     std::atomic<long> iCalls{0};
-    long iFailAt = 0; // 0: never
+    std::atomic<long> iFailAt{0}; // 0: never
 };
 
 failing_kind allocations;
@@ -43,9 +43,18 @@ __attribute__((constructor)) void take_requests() {
     threads.iFailAt = number_of("KELVO_FAIL_THREAD");
 }
 
+/// Nor does anything behind its end: a coverage build writes its counters then.
+void take_no_more() {
+    allocations.iFailAt = 0;
+    threads.iFailAt = 0;
+}
+
 bool fails(failing_kind& kind) {
     if (kind.iFailAt == 0)
         return false;
+    static std::atomic<bool> bWatchesEnd{false};
+    if (!bWatchesEnd.exchange(true))
+        atexit(take_no_more);
     const long iCall = ++kind.iCalls;
     if (iCall < kind.iFailAt || (iCall > kind.iFailAt && !bFromThenOn))
         return false;
