@@ -239,6 +239,19 @@ TEST_F(Merge, RandomFilesAgreeWithASlowReader) {
     }
 }
 
+TEST_F(Merge, BaseProgramNamesAreListedAndNothingIsRead) {
+    trace_writer_options options;
+    options.baseProgName = "first";
+    make(0, {sample_uint32(1, 1, 0)}, options);
+    options.baseProgName = "second";
+    make(1, {sample_uint32(1, 1, 0)}, options);
+    const command_result result = run({"-B"});
+    EXPECT_EQ(result.status, 0);
+    EXPECT_EQ(result.sOut, "[00] Filename: " + m_paths[0] +
+                               "\nfirst\n[01] Filename: " + m_paths[1] + "\nsecond\n");
+    EXPECT_EQ(result.sErr, "");
+}
+
 /// The words of the reader protocol, in a file's bytes.
 uint32_t header_word(const std::string& sPath, size_t uOffset) {
     return load<uint32_t>(read_file(sPath), uOffset);
