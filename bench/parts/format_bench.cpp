@@ -3,8 +3,8 @@
 
 #include "../temp_directory.h"
 #include "compile.h"
-#include "frame.h"
 #include "format_text.h"
+#include "frame.h"
 #include "record.h"
 #include "record_view.h"
 #include "store.h"
