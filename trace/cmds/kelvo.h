@@ -132,7 +132,7 @@ struct template_file {
 // -------------------------------------------------------------- trace files
 
 /// Bytes that processors fetch and take from one another in one piece.
-inline constexpr size_t CACHE_LINE = 64;
+inline constexpr size_t CACHE_LINE = 128;
 
 /// Bits of thread_info::outputFlags.
 enum : uint16_t {
