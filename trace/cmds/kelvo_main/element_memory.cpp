@@ -21,6 +21,11 @@ constexpr size_t ALIGNMENT = 16;
 constexpr size_t MAX_SMALL = 4096;
 constexpr uint32_t UNCOUNTED = 1U << 30;
 constexpr size_t MAX_KEPT = 64;
+/// So many blocks rest after their release before they are filled again. By then
+/// the main thread's processor has let go of them; to take them away from it
+/// would hold the reader up.
+constexpr size_t RESTING = 32;
+static_assert(RESTING < MAX_KEPT);
 static_assert(sizeof(element_block) <= FIRST_ELEMENT);
 
 #if defined(__SANITIZE_ADDRESS__)
@@ -41,28 +46,36 @@ bool is_small(size_t uSize) {
 }
 
 pthread_mutex_t kept_mutex = PTHREAD_MUTEX_INITIALIZER; // guards the kept blocks; taken last
-element_block* pFirstKept = nullptr;
+element_block* pFirstKept = nullptr;                    // released first
+element_block* pLastKept = nullptr;                     // meaningless when there is none
 size_t uKept = 0;
 
+/// The block that was released first, when there are more than `uAbove`; or null.
+element_block* take_kept_block(size_t uAbove) {
+    const mutex_guard guard(kept_mutex);
+    if (uKept <= uAbove)
+        return nullptr;
+    element_block* const pBlock = pFirstKept;
+    pFirstKept = pBlock->pNextKept;
+    --uKept;
+    return pBlock;
+}
+
 element_block* take_block() {
-    {
-        const mutex_guard guard(kept_mutex);
-        if (element_block* const pBlock = pFirstKept; pBlock != nullptr) {
-            pFirstKept = pBlock->pNextKept;
-            --uKept;
-            return pBlock;
-        }
-    }
-    void* const pMemory = std::aligned_alloc(BLOCK_SIZE, BLOCK_SIZE);
-    return pMemory != nullptr ? new (pMemory) element_block{} : nullptr;
+    if (element_block* const pBlock = take_kept_block(RESTING))
+        return pBlock;
+    if (void* const pMemory = std::aligned_alloc(BLOCK_SIZE, BLOCK_SIZE))
+        return new (pMemory) element_block{};
+    return take_kept_block(0);
 }
 
 void give_back(element_block* pBlock) {
     {
         const mutex_guard guard(kept_mutex);
         if (uKept < MAX_KEPT) {
-            pBlock->pNextKept = pFirstKept;
-            pFirstKept = pBlock;
+            pBlock->pNextKept = nullptr;
+            (uKept != 0 ? pLastKept->pNextKept : pFirstKept) = pBlock;
+            pLastKept = pBlock;
             ++uKept;
             return;
         }
