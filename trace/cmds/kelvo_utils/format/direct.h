@@ -33,27 +33,30 @@ inline uint64_t load_integer(parm_type_t type, trace_bytes bytes, int bAddr64) {
 /// Writes the sign and what fills up the width when `iDigits` digits follow.
 char* put_before_digits(char* pOut, const format_piece& piece, bool bNegative, int iDigits);
 
-/// Writes a number or a character whose writer is neither DIRECT_NONE,
-/// DIRECT_NOTHING nor DIRECT_STRING.
-[[gnu::always_inline]] inline void write_direct(text_run& out, const format_piece& piece,
-                                                parm_type_t type, trace_bytes bytes, int bAddr64) {
+/// Whether the piece's conversion is written by put_direct.
+inline bool is_put_directly(const format_piece& piece) {
+    return piece.uDirect >= DIRECT_SIGNED && piece.uDirect <= DIRECT_CHAR;
+}
+
+/// Writes a number or a character at `pOut`, where there is room for
+/// text_run::MAX_ROOM; returns the position after it.
+[[gnu::always_inline]] inline char* put_direct(char* pOut, const format_piece& piece,
+                                               parm_type_t type, trace_bytes bytes, int bAddr64) {
     if (piece.uDirect == DIRECT_CHAR) {
-        out.add(load<char>(bytes, 0));
-        return;
+        *pOut = load<char>(bytes, 0);
+        return pOut + 1;
     }
     uint64_t uValue = load_integer(type, bytes, bAddr64);
-    char* pOut = out.begin_room(text_run::MAX_ROOM);
     if (piece.uDirect == DIRECT_HEX) {
         const int iDigits = count_hex_digits(uValue);
         if (piece.uWidth > iDigits)
             pOut = put_before_digits(pOut, piece, false, iDigits);
-        out.end_room(put_hex_digits(pOut, uValue, iDigits));
-        return;
+        return put_hex_digits(pOut, uValue, iDigits);
     }
     const bool bNegative = piece.uDirect == DIRECT_SIGNED && static_cast<int64_t>(uValue) < 0;
     if (bNegative)
         uValue = -uValue;
     if (bNegative || piece.uWidth > 1)
         pOut = put_before_digits(pOut, piece, bNegative, count_decimal_digits(uValue));
-    out.end_room(put_decimal(pOut, uValue));
+    return put_decimal(pOut, uValue);
 }

@@ -13,6 +13,7 @@
 #include "text_run.h"
 
 #include <algorithm>
+#include <cstring>
 #include <span>
 
 namespace {
@@ -170,8 +171,8 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
         write_value(run.out, conv, type, parm, run.bAddr64);
 }
 
-[[gnu::always_inline]] inline void write_conversion(format_run& run, const conv_spec& place,
-                                                    format_piece& piece, const parm_ref& parm) {
+void write_conversion(format_run& run, const conv_spec& place, format_piece& piece,
+                      const parm_ref& parm) {
     if (piece.uDirect == DIRECT_UNKNOWN) [[unlikely]]
         settle_writer(run, place, piece);
     switch (piece.uDirect) {
@@ -184,8 +185,9 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
         run.out.add(parm_string(parm));
         break;
     default:
-        write_direct(run.out, piece, run.pEntry->pParmTypes[place.parmNum], parm.bytes,
-                     run.bAddr64);
+        run.out.end_room(put_direct(run.out.begin_room(text_run::MAX_ROOM), piece,
+                                    run.pEntry->pParmTypes[place.parmNum], parm.bytes,
+                                    run.bAddr64));
     }
 }
 
@@ -198,25 +200,49 @@ void end_text(format_run& run, const format_piece& last) {
     run.out.add('\n');
 }
 
+/// Writes the conversions from the first on, with the text before each, as long
+/// as they are written directly, their parameters are there and room is left.
+/// Returns how many. No more than the position in the text changes from one to
+/// the next, so that most records are written in one go.
+size_t write_leading_numbers(const format_entry& entry, packed_parms& packed, int bAddr64,
+                             text_run& out) {
+    constexpr size_t ROOM = PADDED_TEXT + text_run::MAX_ROOM;
+    const auto uConvs = static_cast<size_t>(entry.numConvs);
+    char* pOut = out.begin_room(ROOM);
+    size_t uDone = 0;
+    for (; uDone < uConvs; ++uDone) {
+        const format_piece& piece = entry.pPieces[uDone];
+        const parm_type_t type = entry.pParmTypes[uDone];
+        parm_ref parm;
+        if (!is_put_directly(piece) || piece.uLength > PADDED_TEXT ||
+            static_cast<size_t>(out.room_end() - pOut) < ROOM || !packed.take(type, &parm))
+            break;
+        std::memcpy(pOut, piece.pText, PADDED_TEXT);
+        pOut = put_direct(pOut + piece.uLength, piece, type, parm.bytes, bAddr64);
+    }
+    out.end_room(pOut);
+    return uDone;
+}
+
 /// A format that uses its parameters in their order, each once: they are found
 /// and written one by one.
 void write_in_order(const format_entry& entry, trace_bytes* pRun, int bAddr64) {
     text_run out;
     format_run run{.pEntry = &entry, .pList = nullptr, .bAddr64 = bAddr64, .out = out};
     packed_parms packed(*pRun, bAddr64);
-    format_piece* pPiece = entry.pPieces;
+    size_t uConv = write_leading_numbers(entry, packed, bAddr64, out);
     bool bMissing = false;
-    for (const conv_spec& place : conversions(entry)) {
-        run.out.add_padded(literal(*pPiece));
+    for (const conv_spec& place : conversions(entry).subspan(uConv)) {
+        format_piece& piece = entry.pPieces[uConv++];
+        out.add_padded(literal(piece));
         parm_ref parm;
         bMissing = bMissing || !packed.take(entry.pParmTypes[place.parmNum], &parm);
         if (bMissing)
             write_without_parm(run, place);
         else
-            write_conversion(run, place, *pPiece, parm);
-        ++pPiece;
+            write_conversion(run, place, piece, parm);
     }
-    end_text(run, *pPiece);
+    end_text(run, entry.pPieces[uConv]);
     *pRun = packed.rest();
 }
 

@@ -74,6 +74,11 @@ public:
     }
     static constexpr size_t MAX_ROOM = 64;
 
+    /// The end of the room that begin_room gives, which may be larger than asked.
+    const char* room_end() const {
+        return text + sizeof(text);
+    }
+
     /// Needed before anything else writes to the sink.
     void flush() {
         if (uLength > 0)
