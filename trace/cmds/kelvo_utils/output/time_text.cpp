@@ -8,7 +8,7 @@ namespace {
 struct kept_text {
     bool bFormatted = false;
     size_t uSize = 0;
-    char pText[40];
+    char pText[TIME_TEXT_ROOM];
 };
 
 struct {

@@ -3,8 +3,12 @@
 // second costs one conversion. Main thread only.
 #pragma once
 
+#include <cstddef>
 #include <ctime>
 #include <string_view>
+
+/// Bytes that can be read where such a text begins, more than any is long.
+inline constexpr size_t TIME_TEXT_ROOM = 40;
 
 /// The local date of `seconds` since the epoch as strftime's " %x"; empty when
 /// the calendar does not reach that far or the text has 40 bytes or more. Valid
