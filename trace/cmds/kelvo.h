@@ -203,7 +203,7 @@ struct trace_file {
     alignas(CACHE_LINE) int bTimeBaseInQueue; ///< a record that changes timeInfo is queued and not
                                               ///< yet formatted
     file_run* pQueuedRun;    ///< this file's records in the output queue; made by the queue
-    pthread_cond_t roomCond; ///< signalled when the reader may push again
+    pthread_cond_t roomCond; ///< signalled when the reader may push again, or close the file
     int bWaitsForRoom;       ///< the reader waits on roomCond
     uint32_t uRoomAt;        ///< it is to be woken at this numRecPushed
     int bRunning;            ///< the reader was started and has not finished
@@ -258,7 +258,6 @@ struct TrcPreProcHdrElem {
 /// Shared state of the merge.
 struct TrcFmtngProcCtrl {
     pthread_mutex_t priorityQmutex;   ///< recursive; guards the output queue and all below
-    pthread_cond_t priorityQcond;     ///< something was pushed, taken or formatted
     std::atomic<uint32_t> queueDepth; ///< elements in TrcOutput_Q; written under the mutex
     uint64_t PushSeqn;                ///< for the next push
     std::atomic<uint32_t>

@@ -116,19 +116,22 @@ void format_records(taken_records& taken) {
 }
 
 /// Tells the readers that their records are formatted, and releases the records.
+/// Each file has a condition of its own: with one for all, every reader that has
+/// come to its end would wake up for nothing again and again.
 void finish_records(taken_records& taken) {
     {
         const mutex_guard guard(ctrl.priorityQmutex);
         for (const trace_queue_element* pElement : taken.all()) {
             trace_file* const pFile = pElement->pFile;
             pFile->bRecUnderProcess = 0;
-            if (changes_time_base(pElement->header.function)) {
+            const bool bBaseChanged = changes_time_base(pElement->header.function);
+            if (bBaseChanged) {
                 pFile->bTimeBaseInQueue = 0;
                 TrcOutput_Q.time_base_changed();
-                pthread_cond_signal(&pFile->roomCond);
             }
+            if (bBaseChanged || pFile->numRecPushed == 0)
+                pthread_cond_signal(&pFile->roomCond);
         }
-        pthread_cond_broadcast(&ctrl.priorityQcond);
     }
     release_elements(taken.all());
 }

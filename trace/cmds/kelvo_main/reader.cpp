@@ -195,9 +195,9 @@ void read_records(trace_file* pTraceFile, record_batch& batch) {
 
 /// Waits until none of the file's records is queued or being formatted: until
 /// then the main thread works with what closing the file releases.
-void wait_until_drained(const trace_file* pTraceFile) {
+void wait_until_drained(trace_file* pTraceFile) {
     while (pTraceFile->numRecPushed != 0 || pTraceFile->bRecUnderProcess)
-        pthread_cond_wait(&ctrl.priorityQcond, &ctrl.priorityQmutex);
+        pthread_cond_wait(&pTraceFile->roomCond, &ctrl.priorityQmutex);
 }
 
 void end_reading(trace_file* pTraceFile) {

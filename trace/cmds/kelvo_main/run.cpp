@@ -174,7 +174,6 @@ int end_run(int bError) {
 
 int run(const command_line& command) {
     trc_init_recursive_mutex(&ctrl.priorityQmutex);
-    pthread_cond_init(&ctrl.priorityQcond, nullptr);
     anchor.threadId = pthread_self();
 
     // The jump point is set while signals are blocked, so that the mask saved
