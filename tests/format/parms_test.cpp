@@ -126,6 +126,7 @@ TEST(parms, packed_parameters_print_in_their_places) {
         {"%1$c=%1$d", raw_bytes('A' + 0), "A=65\n"},
         {"%1$d=%1$c", raw_bytes('A'), "65=A\n"},
         {"%1$f %1$p %1$r %1$T %1$z %1$d", raw_bytes(i), "%1$f %1$p %1$r %1$T %1$z 7\n"},
+        {"%2$*1$z|%1$d", raw_bytes(i), "|7\n"}, // the rest is nothing, at any width
         {"%1$d %1$f", raw_bytes(0.5), "%1$d 0.500000\n"},
         {"%1$d %1$hx %1$lld", raw_bytes(INT64_MIN),
          "-9223372036854775808 8000000000000000 -9223372036854775808\n"},

@@ -12,7 +12,7 @@ inline void pause_processor() {
 }
 
 /// Locks a mutex that is held for some microseconds as a rule: to sleep and to be
-/// woken takes longer than that, so it is tried for about as long first.
+/// woken takes longer, so it is tried for up to some ten microseconds first.
 inline void lock_mutex(pthread_mutex_t& mutex) {
     constexpr int TRIES = 100;
     constexpr int PAUSES = 8;

@@ -157,6 +157,8 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
     case PARM_TRACE_ID:
         write_format_of_trace_id(run.out, entry.pFile, load<int32_t>(parm.bytes, 0));
         return;
+    case PARM_REST: // here when it has a '*'
+        return;
     default:
         break;
     }

@@ -17,8 +17,7 @@ trace_bytes element_record_bytes(const trace_queue_element* pElement) {
 }
 
 cu_timeinfo load_time_base(trace_bytes bytes, size_t uOffset) {
-    return {.timeinfo1 = load<uint64_t>(bytes, uOffset),
-            .timeinfo2 = load<uint64_t>(bytes, uOffset + sizeof(uint64_t))};
+    return load<cu_timeinfo>(bytes, uOffset);
 }
 
 void replace_time_base(trace_file* pTraceFile, const cu_timeinfo& base) {
