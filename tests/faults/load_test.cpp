@@ -25,7 +25,7 @@ using testing::HasSubstr;
 /// what a file leaves open would soon be missing.
 TEST(Load, ManyFilesNeedFewDescriptors) {
     constexpr size_t RECORDS = 5;
-    const uint64_t uFiles = setting("KELVO_TEST_LOAD_FILES", 200);
+    const uint64_t uFiles = setting("KELVO_TEST_LOAD_FILES", SANITIZED ? 200 : 1000);
     const temp_dir dir;
     const auto files =
         make_samples(dir.path(), {"-n", std::to_string(uFiles), "-r", std::to_string(RECORDS), "-p",
@@ -109,6 +109,57 @@ INSTANTIATE_TEST_SUITE_P(Of, LargeFile, testing::Values(0x80000000U, 0xFFFFFFFCU
 // --------------------------------------------------------------- deep nesting
 
 constexpr uint32_t DEPTH = 1000;
+
+/// Every thread of the file goes down to the last level and up again.
+void write_nesting(const std::string& path, uint32_t uThreads) {
+    trace_writer writer;
+    ASSERT_EQ(writer.create(path.c_str(), {.uFileSize = 16 * 1024 * 1024}), TRACE_WRITER_OK);
+    uint64_t uTime = 0;
+    const auto all_threads = [&](uint32_t uTraceId, uint32_t uLevel) {
+        for (uint32_t uThread = 0; uThread < uThreads; ++uThread)
+            ASSERT_EQ(writer.append_uint32({"_NST", uThread, ++uTime}, uTraceId, uLevel),
+                      TRACE_WRITER_OK);
+    };
+    for (uint32_t uLevel = 0; uLevel < DEPTH; ++uLevel)
+        all_threads(1, uLevel);
+    for (uint32_t uLevel = DEPTH; uLevel-- > 0;)
+        all_threads(2, uLevel);
+}
+
+/// Counts the lines that stand at their level's column; others fail the test.
+uint64_t count_indented(live_command& kelvo) {
+    uint64_t uLines = 0;
+    for (std::string sText, sMore; !(sMore = kelvo.read_text()).empty();) {
+        sText += sMore;
+        size_t uAt = 0;
+        for (size_t uEnd; (uEnd = sText.find('\n', uAt)) != sText.npos; uAt = uEnd + 1) {
+            const std::string_view sLine(sText.data() + uAt, uEnd - uAt);
+            if (!sLine.starts_with(" _NST "))
+                continue;
+            const size_t uText = sLine.find_first_not_of(' ', 6);
+            const size_t uLevel = strtoul(sText.c_str() + uAt + sLine.rfind(' '), nullptr, 10);
+            if (uText == 6 + 2 * uLevel)
+                ++uLines;
+            else
+                ADD_FAILURE() << sLine;
+        }
+        sText.erase(0, uAt);
+    }
+    return uLines;
+}
+
+TEST(Load, ThreadsNestDeeply) {
+    const uint32_t uThreads = SANITIZED ? 20 : 100;
+    const temp_dir dir;
+    write_nesting(dir.file("nest.trc"), uThreads);
+    const std::string sTemplate = "1 \">>enter %u\"\n2 \"<<leave %u\"\n";
+    ASSERT_TRUE(write_file(dir.file("_NST.tpl"), std::as_bytes(std::span(sTemplate))));
+    live_command kelvo({"-o", "c", "-t", dir.path(), dir.file("nest.trc")});
+    EXPECT_EQ(count_indented(kelvo), uint64_t{2} * uThreads * DEPTH);
+    const command_result result = kelvo.wait();
+    expect_sound_end(result);
+    EXPECT_EQ(result.sErr, "");
+}
 
 // --------------------------------------------------------------------- memory
 
