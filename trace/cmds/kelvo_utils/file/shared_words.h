@@ -18,6 +18,7 @@
 
 #include "trace_file_fmt.h"
 
+#include <array>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
@@ -66,6 +67,31 @@ inline uint32_t load_first(const std::byte* pWord) {
     return uWord;
 }
 
+#if defined(__SANITIZE_THREAD__)
+#define KELVO_THREAD_SANITIZER true
+#elif defined(__has_feature)
+#define KELVO_THREAD_SANITIZER __has_feature(thread_sanitizer)
+#else
+#define KELVO_THREAD_SANITIZER false
+#endif
+
+/// Copies a record header whose words may change meanwhile. In one piece: a copy
+/// made of single words would hold up whoever copies it on at once. Only the
+/// thread sanitizer, which knows no other order than that of atomic accesses, gets
+/// it word by word, when a writer in the same process keeps to whole words too.
+inline void copy_header_words(trace_record_header* pHeader, const std::byte* pRecord) {
+    using shared_word [[gnu::may_alias]] = uint32_t;
+    if (!KELVO_THREAD_SANITIZER || reinterpret_cast<uintptr_t>(pRecord) % alignof(uint32_t) != 0) {
+        memcpy(pHeader, pRecord, sizeof *pHeader);
+        return;
+    }
+    const auto* const pWords = reinterpret_cast<const shared_word*>(pRecord);
+    std::array<uint32_t, sizeof *pHeader / sizeof(uint32_t)> words;
+    for (size_t i = 0; i < words.size(); ++i)
+        words[i] = __atomic_load_n(pWords + i, __ATOMIC_RELAXED);
+    memcpy(pHeader, words.data(), sizeof *pHeader);
+}
+
 /// A copy of the record header at `pRecord`. Its seqNumber is read before the
 /// rest: if that is the expected one, the others are complete. What is returned
 /// does not change any more, whatever the writer does.
@@ -73,7 +99,7 @@ inline trace_record_header load_record_header(const void* pRecord) {
     const auto* const pBytes = static_cast<const std::byte*>(pRecord);
     const uint32_t seqNumber = load_first(pBytes + offsetof(trace_record_header, seqNumber));
     trace_record_header header;
-    memcpy(&header, pBytes, sizeof header);
+    copy_header_words(&header, pBytes);
     std::atomic_signal_fence(std::memory_order_seq_cst); // no field is read from the ring again
     if (header.seqNumber != seqNumber) [[unlikely]]      // stored meanwhile; not always, since a
         header.seqNumber = seqNumber;                    // store would hold up the next copy
