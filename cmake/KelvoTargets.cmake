@@ -19,6 +19,31 @@ if(NOT KELVO_SANITIZE)
   set(KELVO_OPTIMISE $<$<CONFIG:RelWithDebInfo>:-O3>)
 endif()
 
+# The command is linked with optimisation over all its libraries, which saves
+# another tenth: many small functions of different folders work on every record.
+# The objects hold ordinary code too (fat), which the tests link: quicker, and the
+# functions that some of them replace stay functions.
+if(CMAKE_CXX_COMPILER_ID STREQUAL GNU AND NOT KELVO_SANITIZE)
+  include(CheckIPOSupported)
+  check_ipo_supported(RESULT KELVO_IPO LANGUAGES CXX)
+endif()
+
+# Has the target, a part of the command or the command itself, take part in this.
+function(kelvo_optimise_whole_program target)
+  if(KELVO_IPO)
+    set_target_properties(${target} PROPERTIES INTERPROCEDURAL_OPTIMIZATION_RELWITHDEBINFO ON
+                                               INTERPROCEDURAL_OPTIMIZATION_RELEASE ON)
+    target_compile_options(${target} PRIVATE $<$<CONFIG:RelWithDebInfo,Release>:-ffat-lto-objects>)
+  endif()
+endfunction()
+
+# Links the target from the ordinary code.
+function(kelvo_link_ordinary_code target)
+  if(KELVO_IPO)
+    target_link_options(${target} PRIVATE -fno-lto)
+  endif()
+endfunction()
+
 # A static library of the sources of one folder; its folder is its include
 # directory. Without sources it is an interface only.
 #   kelvo_library(NAME [SOURCES file...] [LIBS library...])
@@ -29,6 +54,9 @@ function(kelvo_library name)
     target_include_directories(${name} PUBLIC ${CMAKE_CURRENT_SOURCE_DIR})
     target_link_libraries(${name} PUBLIC ${arg_LIBS} PRIVATE kelvo_compile)
     target_compile_options(${name} PRIVATE ${KELVO_OPTIMISE})
+    if(KELVO_PART_OF_COMMAND) # not what is installed: a library must link anywhere
+      kelvo_optimise_whole_program(${name})
+    endif()
   else()
     add_library(${name} INTERFACE)
     target_include_directories(${name} INTERFACE ${CMAKE_CURRENT_SOURCE_DIR})
@@ -42,6 +70,7 @@ function(kelvo_test name)
   cmake_parse_arguments(arg "" "" "SOURCES;LIBS" ${ARGN})
   add_executable(${name} ${arg_SOURCES})
   target_link_libraries(${name} PRIVATE ${arg_LIBS} GTest::gmock GTest::gtest_main kelvo_compile)
+  kelvo_link_ordinary_code(${name})
   gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60
                        PROPERTIES TIMEOUT 300)
 endfunction()
