@@ -30,7 +30,8 @@ private:
     void close_block();
 
     element_block* m_pBlock = nullptr; ///< the one that is being filled
-    size_t m_uUsed = 0;
+    std::byte* m_pNext = nullptr;      ///< its free part, of m_uLeft bytes
+    size_t m_uLeft = 0;
     uint32_t m_uElements = 0; ///< taken from it
 };
 
