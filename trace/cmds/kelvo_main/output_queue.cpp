@@ -118,7 +118,8 @@ template <class entry> bool queue_array<entry>::reserve_one() {
     if (uSize < uCapacity)
         return true;
     const size_t uNewCapacity = uCapacity == 0 ? 64 : 2 * uCapacity;
-    auto* pNew = static_cast<entry*>(malloc(uNewCapacity * sizeof(entry)));
+    // Aligned, so that no entry lies in two cache lines.
+    auto* pNew = static_cast<entry*>(aligned_alloc(CACHE_LINE, uNewCapacity * sizeof(entry)));
     if (pNew == nullptr)
         return false;
     for (size_t uIndex = 0; uIndex < uSize; ++uIndex)
