@@ -42,6 +42,11 @@ constexpr uint32_t ENOUGH_RUNNING_FILES = 16;
 /// More files than this at once do not make a file's share of the cap smaller.
 constexpr int64_t MAX_SHARES = 64;
 
+/// A reader that has its share queued goes on when so much of it is left. Less
+/// often than at half the share, since every time costs two changes of threads,
+/// and early enough to push again before the main thread has printed the rest.
+constexpr uint32_t SHARE_LEFT_DIVISOR = 4;
+
 /// Copies of records that are not yet pushed: enough to make the lock cheap, few
 /// enough to be still in the processor's nearest cache when they are pushed.
 struct record_batch {
@@ -97,8 +102,8 @@ void wait_for_time_base(trace_file* pTraceFile) {
 /// Called with priorityQmutex held, which it gives up while it waits.
 void wait_for_room(trace_file* pTraceFile) {
     if (pTraceFile->numRecPushed >= share_of_queue())
-        while (pTraceFile->numRecPushed > share_of_queue() / 2)
-            wait_on_room(pTraceFile, share_of_queue() / 2, HELD_BACK_WAIT_NS);
+        while (pTraceFile->numRecPushed > share_of_queue() / SHARE_LEFT_DIVISOR)
+            wait_on_room(pTraceFile, share_of_queue() / SHARE_LEFT_DIVISOR, HELD_BACK_WAIT_NS);
     wait_for_time_base(pTraceFile);
     while (queue_is_full_for(pTraceFile))
         wait_on_room(pTraceFile, ALWAYS_QUEUED, FULL_QUEUE_WAIT_NS);
