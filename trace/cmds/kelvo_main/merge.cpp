@@ -92,15 +92,15 @@ void wake_readers(const taken_records& taken) {
         pthread_cond_signal(&taken.pToWake[uIndex]->roomCond);
 }
 
-/// Has the processor fetch a record that will soon be formatted: it was written
-/// on another one, long ago.
+/// Has the processor fetch a record that will soon be formatted, or the better
+/// part of a long one: it was written on another one, long ago.
 void fetch(const taken_records& taken, size_t uIndex) {
     constexpr size_t LINE = 64;
     if (uIndex >= taken.uCount)
         return;
     const auto* const pBytes = reinterpret_cast<const char*>(taken.pElements[uIndex]);
-    __builtin_prefetch(pBytes);
-    __builtin_prefetch(pBytes + LINE);
+    for (size_t uLine = 0; uLine < 3; ++uLine)
+        __builtin_prefetch(pBytes + uLine * LINE);
 }
 
 void format_records(taken_records& taken) {
