@@ -136,7 +136,10 @@ void keep_latest_time(trace_file* pTraceFile, const timespec& time) {
     if (time.tv_sec < latest.tv_sec ||
         (time.tv_sec == latest.tv_sec && time.tv_nsec <= latest.tv_nsec))
         return;
-    pTraceFile->modTime = time;
+    // Field by field, as they were stored just now: a copy in one move would have
+    // to wait for both stores.
+    pTraceFile->modTime.tv_sec = time.tv_sec;
+    pTraceFile->modTime.tv_nsec = time.tv_nsec;
     pTraceFile->timeStampIsValid = 1;
 }
 
