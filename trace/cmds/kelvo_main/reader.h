@@ -7,7 +7,7 @@
 // - at the cap: while the queue holds MAX_QUEUED records or more and this file
 //   has more than ALWAYS_QUEUED of them (so that a file with little queued is
 //   never held back, and the merge rule never waits for ever);
-// - at its share: when this file has queued its part of the cap, until half of
+// - at its share: when this file has queued its part of the cap, until most of
 //   that is printed, so that a file which comes later finds room;
 // - behind a record that changes the file's time base, until that record is
 //   formatted: what follows is compared under the new base only.
