@@ -124,6 +124,9 @@ int set_file_start(trace_file* pTraceFile) {
 }
 
 bool start_is_reached(trace_file* pTraceFile, const trace_record_header& header) {
+    // Nothing may be stored at every record: the main thread reads this cache line.
+    if (pTraceFile->startOptions == FILE_START_ALL) [[likely]]
+        return true;
     bool bReached = true;
     if (pTraceFile->startOptions == FILE_START_RECORD) {
         if (pTraceFile->recordNumber < INT_MAX)
