@@ -5,6 +5,7 @@
 
 #include "compile.h"
 #include "raw_trace.h"
+#include "sink.h"
 #include "stdout_stream.h"
 
 #include <gtest/gtest.h>
@@ -48,15 +49,29 @@ std::string output_of(const std::function<void()>& writes) {
     return GetCapturedStdout();
 }
 
-/// Writes `format` over a packed run and returns how many bytes are left over.
-size_t write_packed(const std::string& format, const byte_vector& bytes, int bAddr64 = 1) {
+/// The way of records: what can be is written while it is found.
+void write_as_found(const format_entry* pEntry, trace_bytes* pRun, int bAddr64) {
+    format_packed_parms(pEntry, pRun, bAddr64);
+}
+
+/// The same text in two steps, the second of which data records share.
+void write_listed(const format_entry* pEntry, trace_bytes* pRun, int bAddr64) {
     static parm_list list;
+    bld_parm_list_packed(pEntry, pRun, bAddr64, &list);
+    format_parms(pEntry, &list, bAddr64);
+}
+
+using write_way = void (*)(const format_entry* pEntry, trace_bytes* pRun, int bAddr64);
+constexpr write_way WAYS[] = {write_as_found, write_listed};
+
+/// Writes `format` over a packed run and returns how many bytes are left over.
+size_t write_packed(const std::string& format, const byte_vector& bytes, int bAddr64 = 1,
+                    write_way pWrite = write_as_found) {
     trace_bytes run = bytes;
     const entry_ptr pEntry = compile(format);
     if (!pEntry)
         return SIZE_MAX;
-    bld_parm_list_packed(pEntry.get(), &run, bAddr64, &list);
-    format_parms(pEntry.get(), &list, bAddr64);
+    pWrite(pEntry.get(), &run, bAddr64);
     return run.size();
 }
 
@@ -140,12 +155,68 @@ TEST(parms, packed_parameters_print_in_their_places) {
          "%" + std::string(35, '-') + "*d|\n"},
         {"%" + std::string(37, '-') + ".*d|", raw_bytes(i, -1), "7|\n"},
     };
-    for (const auto& row : cases) {
-        size_t uLeft = 0;
-        EXPECT_EQ(output_of([&] { uLeft = write_packed(row.format, row.bytes, row.bAddr64); }),
-                  row.text)
-            << row.format;
-        EXPECT_EQ(uLeft, row.uLeft) << row.format;
+    for (const write_way pWrite : WAYS) {
+        for (const auto& row : cases) {
+            size_t uLeft = 0;
+            EXPECT_EQ(output_of([&] {
+                          uLeft = write_packed(row.format, row.bytes, row.bAddr64, pWrite);
+                      }),
+                      row.text)
+                << row.format;
+            EXPECT_EQ(uLeft, row.uLeft) << row.format;
+        }
+    }
+}
+
+TEST(parms, leading_numbers_print_the_same_however_a_body_begins_and_a_run_ends) {
+    std::string many;
+    for (int i = 0; i < 40; i++)
+        many += "a text of more than some bytes %032d";
+    const std::string formats[] = {
+        "%d",
+        "n %u, %d",
+        "<%d",
+        ">>%d %d",
+        "<<%d\n%x\n",
+        "%c%d",
+        "%c%c%d",
+        "%d%c%d\n",
+        "\n%d",
+        "%d\n\n%d",
+        "%s%d",
+        "%hd%hu%lx%ld%08lx",
+        "%lld %5x %-5d",
+        many,
+        "%d%z",
+        "%d %z",
+        "%d%z%d",
+        "%d%T%d",
+        "%%%d%%",
+        "<%d %s",
+    };
+    byte_vector bytes = raw_bytes('<', '<', '\n', 'x');
+    for (uint32_t i = 0; i < 50; i++)
+        bytes = join({bytes, raw_bytes(0x3C0A3C3CU - 0x20000001U * i)});
+    for (const std::string& format : formats) {
+        const entry_ptr pEntry = compile(format);
+        for (const int bAddr64 : {0, 1}) {
+            for (size_t uSize = 0; uSize <= bytes.size(); uSize++) {
+                std::string texts[2];
+                for (size_t uWay = 0; uWay < 2; uWay++) {
+                    trace_bytes run(bytes.data(), uSize);
+                    texts[uWay] = output_of([&] {
+                        anchor.outputFlags = OUTPUT_START_PENDING;
+                        anchor.headerIndent = 5;
+                        WAYS[uWay](pEntry.get(), &run, bAddr64);
+                        WAYS[uWay](pEntry.get(), &run,
+                                   bAddr64); // what is left, on a line of its own
+                        output_abandon_rec();
+                    });
+                    texts[uWay] += std::to_string(run.size());
+                }
+                ASSERT_EQ(texts[0], texts[1]) << format << " over " << uSize << " bytes";
+            }
+        }
     }
 }
 

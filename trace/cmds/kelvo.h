@@ -79,6 +79,21 @@ struct format_piece {
     uint8_t uDirect; ///< a direct_writer; found out when the conversion is first written
     uint8_t uWidth;  ///< of a number that is written directly
     bool bZeros;     ///< it is filled up with zeros rather than blanks
+
+    // Of a leading number, for the traces of 32-bit and of 64-bit programs:
+    uint8_t uShape[2];   ///< an integer_shape
+    uint16_t uOffset[2]; ///< of its parameter in a packed run
+};
+
+/// The conversions at the begin of a format that uses its parameters in order,
+/// as far as they are numbers written directly, without a newline or a marker in
+/// the text before. In a packed run their parameters have fixed places. Found out
+/// when the format is first used.
+struct leading_numbers {
+    bool bKnown;
+    bool bTakesRest;  ///< behind them the rest of the run is taken, and nothing printed
+    uint8_t uCount;   ///< the numbers
+    uint16_t uEnd[2]; ///< of the last one's parameter: as long must the run be
 };
 
 /// Writers of the usual conversions, which go by nothing but the value.
@@ -111,6 +126,7 @@ struct format_entry {
     format_piece* pPieces; ///< numConvs + 1: before each conversion, and after the last one
                            ///< (there without a newline at the very end)
     bool bParmsInOrder;    ///< the conversions use the parameters in order, each once, without '*'
+    mutable leading_numbers leading; ///< when they do
 };
 
 /// The formats of one component.

@@ -46,20 +46,36 @@ direct_writer find_direct_writer(const conversion& conv, parm_type_t type) {
     return DIRECT_NONE;
 }
 
-} // namespace
-
-void choose_direct_writer(format_piece* pPiece, const conversion& conv, parm_type_t type) {
+/// Settles how `conv` is written for a parameter of type `type`.
+void choose_direct_writer(format_piece& piece, const conversion& conv, parm_type_t type) {
     if (base_type(type) == PARM_REST) {
-        pPiece->uDirect = DIRECT_NOTHING;
+        piece.uDirect = DIRECT_NOTHING;
         return;
     }
     const bool bUsed =
         conv.iRebuiltLength <= MAX_REBUILT_CONVERSION && conversion_fits(conv.letter, type);
-    pPiece->uDirect = bUsed ? find_direct_writer(conv, type) : DIRECT_NONE;
-    if (pPiece->uDirect == DIRECT_NONE)
+    piece.uDirect = bUsed ? find_direct_writer(conv, type) : DIRECT_NONE;
+    if (piece.uDirect == DIRECT_NONE)
         return;
-    pPiece->uWidth = static_cast<uint8_t>(conv.iWidth);
-    pPiece->bZeros = conv.uFlags & CONVERSION_ZERO;
+    piece.uWidth = static_cast<uint8_t>(conv.iWidth);
+    piece.bZeros = conv.uFlags & CONVERSION_ZERO;
+}
+
+} // namespace
+
+void settle_direct_writer(const format_entry& entry, size_t uConv) {
+    format_piece& piece = entry.pPieces[uConv];
+    const conv_spec& place = entry.pConvSpecs[uConv];
+    if (piece.uDirect != DIRECT_UNKNOWN)
+        return;
+    if (place.widthParmNum != NO_PARM || place.precParmNum != NO_PARM) {
+        piece.uDirect = DIRECT_NONE;
+        return;
+    }
+    const parm_type_t type = entry.pParmTypes[place.parmNum];
+    const std::string_view text(entry.pString + place.offset, place.lenConv);
+    choose_direct_writer(
+        piece, parse_conversion(text, entry.properties & FORMAT_NUMBERED_PARMS, type, 0, 0), type);
 }
 
 char* put_before_digits(char* pOut, const format_piece& piece, bool bNegative, int iDigits) {

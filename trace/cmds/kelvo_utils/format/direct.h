@@ -11,23 +11,55 @@
 #include "text_run.h"
 #include "trace_load.h"
 
-/// Settles how `conv`, which takes no width or precision from a parameter, is
-/// written for a parameter of type `type`.
-void choose_direct_writer(format_piece* pPiece, const conversion& conv, parm_type_t type);
+/// Settles how the entry's conversion number `uConv` is written, if it is not
+/// settled yet.
+void settle_direct_writer(const format_entry& entry, size_t uConv);
 
-/// The value in 64 bits, with its sign or without as its type says.
-inline uint64_t load_integer(parm_type_t type, trace_bytes bytes, int bAddr64) {
+/// How an integer or a character lies in a record.
+enum integer_shape : uint8_t {
+    INTEGER_CHAR,
+    INTEGER_SIGNED_16,
+    INTEGER_UNSIGNED_16,
+    INTEGER_SIGNED_32,
+    INTEGER_UNSIGNED_32,
+    INTEGER_64,
+};
+
+/// The shape of a parameter of an integer type or of PARM_CHAR.
+inline integer_shape shape_of_integer(parm_type_t type, int bAddr64) {
     const bool bUnsigned = type & PARM_UNSIGNED;
-    parm_type_t base = base_type(type);
-    if (base == PARM_LONG)
-        base = bAddr64 ? PARM_LONGLONG : PARM_INT;
-    if (base == PARM_INT)
-        return bUnsigned ? load<uint32_t>(bytes, 0)
-                         : static_cast<uint64_t>(load<int32_t>(bytes, 0));
-    if (base == PARM_SHORT)
-        return bUnsigned ? load<uint16_t>(bytes, 0)
-                         : static_cast<uint64_t>(load<int16_t>(bytes, 0));
-    return load<uint64_t>(bytes, 0);
+    switch (base_type(type)) {
+    case PARM_CHAR:
+        return INTEGER_CHAR;
+    case PARM_SHORT:
+        return bUnsigned ? INTEGER_UNSIGNED_16 : INTEGER_SIGNED_16;
+    case PARM_LONG:
+        if (bAddr64)
+            return INTEGER_64;
+        [[fallthrough]];
+    case PARM_INT:
+        return bUnsigned ? INTEGER_UNSIGNED_32 : INTEGER_SIGNED_32;
+    default:
+        return INTEGER_64;
+    }
+}
+
+/// The value at `uOffset` in 64 bits, with its sign or without as its shape says.
+inline uint64_t load_integer(integer_shape shape, trace_bytes bytes, size_t uOffset) {
+    switch (shape) {
+    case INTEGER_CHAR:
+        return load<uint8_t>(bytes, uOffset);
+    case INTEGER_SIGNED_16:
+        return static_cast<uint64_t>(load<int16_t>(bytes, uOffset));
+    case INTEGER_UNSIGNED_16:
+        return load<uint16_t>(bytes, uOffset);
+    case INTEGER_SIGNED_32:
+        return static_cast<uint64_t>(load<int32_t>(bytes, uOffset));
+    case INTEGER_UNSIGNED_32:
+        return load<uint32_t>(bytes, uOffset);
+    default:
+        return load<uint64_t>(bytes, uOffset);
+    }
 }
 
 /// Writes the sign and what fills up the width when `iDigits` digits follow.
@@ -38,15 +70,19 @@ inline bool is_put_directly(const format_piece& piece) {
     return piece.uDirect >= DIRECT_SIGNED && piece.uDirect <= DIRECT_CHAR;
 }
 
-/// Writes a number or a character at `pOut`, where there is room for
-/// text_run::MAX_ROOM; returns the position after it.
+/// Most bytes that put_direct writes: a sign, the digits in their width, and
+/// what put_decimal writes behind them.
+inline size_t direct_room(const format_piece& piece) {
+    return 1 + std::max<size_t>(piece.uWidth, DIGITS_ROOM) + 7;
+}
+
+/// Writes the number or character at `pOut`; returns the position after it.
 [[gnu::always_inline]] inline char* put_direct(char* pOut, const format_piece& piece,
-                                               parm_type_t type, trace_bytes bytes, int bAddr64) {
+                                               uint64_t uValue) {
     if (piece.uDirect == DIRECT_CHAR) {
-        *pOut = load<char>(bytes, 0);
+        *pOut = static_cast<char>(uValue);
         return pOut + 1;
     }
-    uint64_t uValue = load_integer(type, bytes, bAddr64);
     if (piece.uDirect == DIRECT_HEX) {
         const int iDigits = count_hex_digits(uValue);
         if (piece.uWidth > iDigits)

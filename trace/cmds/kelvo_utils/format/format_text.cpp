@@ -7,6 +7,7 @@
 #include "conversion.h"
 #include "direct.h"
 #include "field.h"
+#include "leading_numbers.h"
 #include "packed_parms.h"
 #include "record_text.h"
 #include "template_file.h"
@@ -133,18 +134,6 @@ void write_without_parm(format_run& run, const conv_spec& place) {
         run.out.add(run.text_of(place));
 }
 
-/// Finds out how the conversion is written that has not been written before.
-[[gnu::cold]] void settle_writer(const format_run& run, const conv_spec& place,
-                                 format_piece& piece) {
-    const parm_type_t type = run.pEntry->pParmTypes[place.parmNum];
-    const bool bNumbered = run.pEntry->properties & FORMAT_NUMBERED_PARMS;
-    if (place.widthParmNum == NO_PARM && place.precParmNum == NO_PARM)
-        choose_direct_writer(&piece, parse_conversion(run.text_of(place), bNumbered, type, 0, 0),
-                             type);
-    else
-        piece.uDirect = DIRECT_NONE;
-}
-
 /// The way of the conversions that are not written directly.
 void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm) {
     const format_entry& entry = *run.pEntry;
@@ -173,10 +162,12 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
         write_value(run.out, conv, type, parm, run.bAddr64);
 }
 
-void write_conversion(format_run& run, const conv_spec& place, format_piece& piece,
-                      const parm_ref& parm) {
+/// Writes the entry's conversion number `uConv`.
+void write_conversion(format_run& run, size_t uConv, const parm_ref& parm) {
+    const format_piece& piece = run.pEntry->pPieces[uConv];
+    const conv_spec& place = run.pEntry->pConvSpecs[uConv];
     if (piece.uDirect == DIRECT_UNKNOWN) [[unlikely]]
-        settle_writer(run, place, piece);
+        settle_direct_writer(*run.pEntry, uConv);
     switch (piece.uDirect) {
     case DIRECT_NONE:
         write_by_text(run, place, parm);
@@ -187,9 +178,10 @@ void write_conversion(format_run& run, const conv_spec& place, format_piece& pie
         run.out.add(parm_string(parm));
         break;
     default:
-        run.out.end_room(put_direct(run.out.begin_room(text_run::MAX_ROOM), piece,
-                                    run.pEntry->pParmTypes[place.parmNum], parm.bytes,
-                                    run.bAddr64));
+        run.out.end_room(put_direct(
+            run.out.begin_room(direct_room(piece)), piece,
+            load_integer(shape_of_integer(run.pEntry->pParmTypes[place.parmNum], run.bAddr64),
+                         parm.bytes, 0)));
     }
 }
 
@@ -202,47 +194,30 @@ void end_text(format_run& run, const format_piece& last) {
     run.out.add('\n');
 }
 
-/// Writes the conversions from the first on, with the text before each, as long
-/// as they are written directly, their parameters are there and room is left.
-/// Returns how many. No more than the position in the text changes from one to
-/// the next, so that most records are written in one go.
-size_t write_leading_numbers(const format_entry& entry, packed_parms& packed, int bAddr64,
-                             text_run& out) {
-    constexpr size_t ROOM = PADDED_TEXT + text_run::MAX_ROOM;
-    const auto uConvs = static_cast<size_t>(entry.numConvs);
-    char* pOut = out.begin_room(ROOM);
-    size_t uDone = 0;
-    for (; uDone < uConvs; ++uDone) {
-        const format_piece& piece = entry.pPieces[uDone];
-        const parm_type_t type = entry.pParmTypes[uDone];
-        parm_ref parm;
-        if (!is_put_directly(piece) || piece.uLength > PADDED_TEXT ||
-            static_cast<size_t>(out.room_end() - pOut) < ROOM || !packed.take(type, &parm))
-            break;
-        std::memcpy(pOut, piece.pText, PADDED_TEXT);
-        pOut = put_direct(pOut + piece.uLength, piece, type, parm.bytes, bAddr64);
-    }
-    out.end_room(pOut);
-    return uDone;
-}
-
 /// A format that uses its parameters in their order, each once: they are found
 /// and written one by one.
 void write_in_order(const format_entry& entry, trace_bytes* pRun, int bAddr64) {
+    size_t uUsed = 0;
+    size_t uConv = write_leading_numbers(entry, *pRun, bAddr64, &uUsed);
+    if (uConv != 0 && uConv == conversions(entry).size()) { // most often that was all
+        output_text(literal(entry.pPieces[uConv]));
+        output_char('\n');
+        *pRun = load_run(*pRun, uUsed);
+        return;
+    }
     text_run out;
     format_run run{.pEntry = &entry, .pList = nullptr, .bAddr64 = bAddr64, .out = out};
-    packed_parms packed(*pRun, bAddr64);
-    size_t uConv = write_leading_numbers(entry, packed, bAddr64, out);
+    packed_parms packed(*pRun, bAddr64, uUsed);
     bool bMissing = false;
     for (const conv_spec& place : conversions(entry).subspan(uConv)) {
-        format_piece& piece = entry.pPieces[uConv++];
-        out.add_padded(literal(piece));
+        out.add_padded(literal(entry.pPieces[uConv]));
         parm_ref parm;
         bMissing = bMissing || !packed.take(entry.pParmTypes[place.parmNum], &parm);
         if (bMissing)
             write_without_parm(run, place);
         else
-            write_conversion(run, place, piece, parm);
+            write_conversion(run, uConv, parm);
+        ++uConv;
     }
     end_text(run, entry.pPieces[uConv]);
     *pRun = packed.rest();
@@ -253,16 +228,16 @@ void write_in_order(const format_entry& entry, trace_bytes* pRun, int bAddr64) {
 void format_parms(const format_entry* pFormatEntry, const parm_list* pList, int bAddr64) {
     text_run out;
     format_run run{.pEntry = pFormatEntry, .pList = pList, .bAddr64 = bAddr64, .out = out};
-    format_piece* pPiece = pFormatEntry->pPieces;
+    size_t uConv = 0;
     for (const conv_spec& place : conversions(*pFormatEntry)) {
-        run.out.add_padded(literal(*pPiece));
+        run.out.add_padded(literal(pFormatEntry->pPieces[uConv]));
         if (run.has_parms(place))
-            write_conversion(run, place, *pPiece, pList->pParms[place.parmNum]);
+            write_conversion(run, uConv, pList->pParms[place.parmNum]);
         else
             write_without_parm(run, place);
-        ++pPiece;
+        ++uConv;
     }
-    end_text(run, *pPiece);
+    end_text(run, pFormatEntry->pPieces[uConv]);
 }
 
 void format_packed_parms(const format_entry* pFormatEntry, trace_bytes* pRun, int bAddr64) {

@@ -112,6 +112,15 @@ char* put_fields(char* pOut, const prefix_source& source) {
     return pOut;
 }
 
+// Two digits at least.
+char* put_index(char* pOut, uint32_t index) {
+    if (index >= 100) [[unlikely]]
+        return put_decimal(pOut, index);
+    *pOut++ = static_cast<char>('0' + index / 10);
+    *pOut++ = static_cast<char>('0' + index % 10);
+    return pOut;
+}
+
 // The file index counts as four columns, also where it takes more.
 constexpr int INDEX_COLUMNS = 4;
 
@@ -120,7 +129,7 @@ void write_prefix(const trace_file* pTraceFile, const prefix_source& source) {
     int columns = 0;
     if (anchor.iNumberFiles > 1) {
         *pFields++ = '[';
-        pFields = put_number(pFields, static_cast<uint64_t>(pTraceFile->index), 10, 2, '0');
+        pFields = put_index(pFields, static_cast<uint32_t>(pTraceFile->index));
         *pFields++ = ']';
         columns = INDEX_COLUMNS;
     }

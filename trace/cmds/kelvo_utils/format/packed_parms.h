@@ -33,26 +33,36 @@ inline constexpr std::array<packed_shape, PARM_BASE_MASK + 1> packedShapes64 = {
     {1, 0},
 }};
 
-/// In those of 32-bit programs a long has the shape of an int.
+/// In the traces of 32-bit programs a long has the shape of an int.
 inline constexpr std::array<packed_shape, PARM_BASE_MASK + 1> packedShapes32 = [] {
     auto shapes = packedShapes64;
     shapes[PARM_LONG] = shapes[PARM_INT];
     return shapes;
 }();
 
+/// The shapes by base type. `bAddr64`: the traced program ran in 64-bit mode.
+constexpr const packed_shape* packed_shapes(int bAddr64) {
+    return bAddr64 ? packedShapes64.data() : packedShapes32.data();
+}
+
+/// Where a parameter that begins at `uFrom` at the earliest is aligned.
+constexpr size_t align_parm(size_t uFrom, const packed_shape& shape) {
+    const size_t uMask = shape.uAlignment - size_t{1};
+    return (uFrom + uMask) & ~uMask;
+}
+
 /// Takes the parameters off a run of bytes in their order.
 class packed_parms {
 public:
-    /// `bAddr64`: the traced program ran in 64-bit mode.
-    packed_parms(trace_bytes run, int bAddr64)
-        : m_run(run), m_pShapes(bAddr64 ? packedShapes64.data() : packedShapes32.data()) {}
+    /// `uUsed`: bytes of the parameters that were taken before.
+    packed_parms(trace_bytes run, int bAddr64, size_t uUsed = 0)
+        : m_run(run), m_pShapes(packed_shapes(bAddr64)), m_uUsed(uUsed) {}
 
     /// Finds the next parameter. Returns false, and takes nothing, when it does
     /// not lie wholly inside the run.
     bool take(parm_type_t type, parm_ref* pParm) {
         const packed_shape& shape = m_pShapes[base_type(type)];
-        const size_t uMask = shape.uAlignment - size_t{1};
-        const size_t uStart = (m_uUsed + uMask) & ~uMask;
+        const size_t uStart = align_parm(m_uUsed, shape);
         const size_t uSize = shape.uSize != 0 ? shape.uSize : unfixed_size(base_type(type));
         if (!lies_inside(m_run, uStart, uSize))
             return false;
@@ -81,5 +91,5 @@ private:
 
     trace_bytes m_run;
     const packed_shape* m_pShapes;
-    size_t m_uUsed = 0;
+    size_t m_uUsed;
 };

@@ -72,12 +72,7 @@ public:
     void end_room(const char* pEnd) {
         uLength = static_cast<size_t>(pEnd - text);
     }
-    static constexpr size_t MAX_ROOM = 64;
-
-    /// The end of the room that begin_room gives, which may be larger than asked.
-    const char* room_end() const {
-        return text + sizeof(text);
-    }
+    static constexpr size_t MAX_ROOM = 512;
 
     /// Needed before anything else writes to the sink.
     void flush() {
@@ -87,6 +82,6 @@ public:
     }
 
 private:
-    char text[512]; ///< not set up: a record must not pay for what it does not use
+    char text[MAX_ROOM]; ///< not set up: a record must not pay for what it does not use
     size_t uLength = 0;
 };

@@ -7,10 +7,6 @@
 
 namespace {
 
-bool is_marker(char ch) {
-    return ch == '<' || ch == '>';
-}
-
 void indent() {
     if (anchor.curColumn < anchor.currentIndent) {
         stdout_fill(' ', static_cast<size_t>(anchor.currentIndent - anchor.curColumn));
@@ -93,6 +89,13 @@ void output_text(std::string_view text) {
             anchor.curColumn = 0;
         text.remove_prefix(size);
     }
+}
+
+void output_begin_text() {
+    if ((anchor.outputFlags & OUTPUT_START_PENDING) != 0)
+        start_body(' ');
+    if (anchor.curColumn == 0)
+        indent();
 }
 
 void output_string(const char* pString) {

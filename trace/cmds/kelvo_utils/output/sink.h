@@ -18,6 +18,11 @@ inline constexpr int16_t MAX_INDENT = INT16_MAX - 1;
 /// Deepest level that is counted.
 inline constexpr uint16_t MAX_NESTING_LEVEL = UINT16_MAX;
 
+/// Whether `ch` is one of the characters that make nesting markers.
+constexpr bool is_marker(char ch) {
+    return ch == '<' || ch == '>';
+}
+
 /// Writes one character.
 void output_char(char ch);
 
@@ -26,6 +31,11 @@ void output_text(std::string_view text);
 
 /// The same as output_char for each character; null writes nothing.
 void output_string(const char* pString);
+
+/// Does what output_text does before ordinary text: opens the body, indents a
+/// line. For who then writes to the stream himself: at least one character, the
+/// first no marker, and no newline.
+void output_begin_text();
 
 /// Gives up a record that was opened and will not be closed: the sink is
 /// between records again. A line that it has begun is ended.

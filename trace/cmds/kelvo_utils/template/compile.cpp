@@ -256,8 +256,9 @@ void lay_out_pieces(format_entry& entry, char* pText) {
         if (bLast && literal.ends_with('\n'))
             literal.remove_suffix(1); // every text is ended with a newline of its own
         char* const pTextEnd = copy_literal(pText, literal);
-        entry.pPieces[i] = {pText, static_cast<uint32_t>(pTextEnd - pText), DIRECT_UNKNOWN, 0,
-                            false};
+        entry.pPieces[i] = format_piece{};
+        entry.pPieces[i].pText = pText;
+        entry.pPieces[i].uLength = static_cast<uint32_t>(pTextEnd - pText);
         pText = pTextEnd;
         if (!bLast)
             pCursor = pEnd + entry.pConvSpecs[i].lenConv;
