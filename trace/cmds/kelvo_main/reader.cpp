@@ -42,10 +42,11 @@ constexpr uint32_t ENOUGH_RUNNING_FILES = 16;
 /// More files than this at once do not make a file's share of the cap smaller.
 constexpr int64_t MAX_SHARES = 64;
 
-/// A reader that has its share queued goes on when so much of it is left. Less
-/// often than at half the share, since every time costs two changes of threads,
-/// and early enough to push again before the main thread has printed the rest.
-constexpr uint32_t SHARE_LEFT_DIVISOR = 4;
+/// A reader that has its share queued goes on when a third of it is left. Going on
+/// costs two changes of threads, so it should be rare; but many readers come to
+/// this point together, and the last of them must push again before the main
+/// thread has printed what is left of its records.
+constexpr uint32_t SHARE_LEFT_DIVISOR = 3;
 
 /// Copies of records that are not yet pushed: enough to make the lock cheap, few
 /// enough to be still in the processor's nearest cache when they are pushed.
