@@ -76,7 +76,7 @@ inline constexpr size_t PADDED_TEXT = 16;
 struct format_piece {
     const char* pText; ///< PADDED_TEXT bytes can be read there, however short it is
     uint32_t uLength;
-    uint8_t uDirect; ///< a direct_writer; found out when the conversion is first written
+    uint8_t uDirect; ///< a direct_writer; found out when the format is first written
     uint8_t uWidth;  ///< of a number that is written directly
     bool bZeros;     ///< it is filled up with zeros rather than blanks
 
@@ -85,15 +85,15 @@ struct format_piece {
     uint16_t uOffset[2]; ///< of its parameter in a packed run
 };
 
-/// The conversions at the begin of a format that uses its parameters in order,
-/// as far as they are numbers written directly, without a newline or a marker in
-/// the text before. In a packed run their parameters have fixed places. Found out
-/// when the format is first used.
+/// The conversions that a format which uses its parameters in order begins with, as
+/// far as they are numbers written directly, with no newline between them and no
+/// marker at the start, and fit into some hundred bytes. In a packed run their
+/// parameters have fixed places. Found out when the format is first written.
 struct leading_numbers {
     bool bKnown;
     bool bTakesRest;  ///< behind them the rest of the run is taken, and nothing printed
     uint8_t uCount;   ///< the numbers
-    uint16_t uEnd[2]; ///< of the last one's parameter: as long must the run be
+    uint16_t uEnd[2]; ///< of the last one's parameter: the run must be as long
 };
 
 /// Writers of the usual conversions, which go by nothing but the value.

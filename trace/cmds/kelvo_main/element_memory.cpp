@@ -8,10 +8,11 @@
 #include <new>
 
 /// The head of a block. A block starts at a multiple of its size, so that an
-/// element tells its block. Its head and its elements do not begin at the start,
-/// but as many cache lines behind it as the block's address tells (its colour):
-/// else the heads of all blocks, and the elements that readers of many like files
-/// write side by side, would fall into a few sets of the processor's caches.
+/// element tells its block. Its head does not stand at the start but as many cache
+/// lines behind it as the block's address tells (its colour), and its elements
+/// begin COLOURS lines behind the head: else the heads of all blocks, and the
+/// elements that readers of many like files write side by side, would fall into a
+/// few sets of the processor's caches.
 struct element_block {
     element_block* pNextKept;
     std::atomic<uint32_t> uLive; ///< elements not yet released; UNCOUNTED more while it is filled
@@ -26,9 +27,9 @@ constexpr size_t FIRST_ELEMENT = COLOURS * LINE; // behind the head of a block
 constexpr size_t ALIGNMENT = 16;
 constexpr size_t MAX_SMALL = 4096;
 constexpr uint32_t UNCOUNTED = 1U << 30;
-/// A full queue of short records, with a block for each of many readers, takes
-/// about as many; to get blocks from the system again and again would cost more
-/// than to format the records.
+/// More than a full queue of short records takes, with a block for each of many
+/// readers: to get blocks from the system again and again would cost more than to
+/// format the records.
 constexpr size_t MAX_KEPT = 256;
 /// So many blocks rest after their release before they are filled again. By then
 /// the main thread's processor has let go of them; to take them away from it

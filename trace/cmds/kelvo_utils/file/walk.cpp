@@ -76,11 +76,13 @@ void move_past(trace_file* pTraceFile, const trace_record_header& current) {
     pTraceFile->pCurRec = ring_position(pTraceFile, uNext);
 }
 
-/// Has the processor fetch what will be read some records later. (Only a hint:
-/// beyond the mapping it does nothing.) By itself it stops at the end of a page.
+/// Has the processor fetch what will be read some records later: its own
+/// prefetching stops at the end of each page. (Only a hint: where nothing is
+/// mapped it does nothing.)
 void fetch_ahead(const trace_file* pTraceFile) {
-    constexpr size_t DISTANCE = 1024;
-    __builtin_prefetch(reinterpret_cast<const char*>(pTraceFile->pCurRec) + DISTANCE);
+    constexpr uint64_t DISTANCE = 1024;
+    const uint64_t uAhead = ring_offset(pTraceFile, pTraceFile->pCurRec) + DISTANCE;
+    __builtin_prefetch(ring_position(pTraceFile, uAhead));
 }
 
 /// Lets the writer know that the record was passed.

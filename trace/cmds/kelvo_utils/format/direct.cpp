@@ -5,7 +5,7 @@
 namespace {
 
 constexpr int MAX_DIRECT_WIDTH = 32;
-static_assert(MAX_DIRECT_WIDTH + 1 + 7 <= static_cast<int>(text_run::MAX_ROOM));
+static_assert(MAX_DIRECT_WIDTH <= UINT8_MAX); // kept as uWidth
 
 bool is_integer(parm_type_t base) {
     return base == PARM_SHORT || base == PARM_INT || base == PARM_LONG || base == PARM_LONGLONG;

@@ -72,6 +72,7 @@ size_t write_leading_numbers(const format_entry& entry, trace_bytes run, int bAd
         find_leading_numbers(entry);
     const bool bMode = bAddr64 != 0;
     const size_t uCount = entry.leading.uCount;
+    *puUsed = 0;
     if (uCount == 0 || entry.leading.uEnd[bMode] > run.size())
         return 0;
     output_begin_text();

@@ -10,7 +10,7 @@
 
 /// Writes the leading numbers of a format that uses its parameters in order, with
 /// the text before each. Returns how many conversions are done with that, and
-/// stores how many bytes of `run` they took: none where the run is too short for
-/// all of them.
+/// stores how many bytes of `run` they took: both 0, and nothing written, where
+/// the run is too short for all of them.
 size_t write_leading_numbers(const format_entry& entry, trace_bytes run, int bAddr64,
                              size_t* puUsed);

@@ -33,8 +33,8 @@ void output_text(std::string_view text);
 void output_string(const char* pString);
 
 /// Does what output_text does before ordinary text: opens the body, indents a
-/// line. For who then writes to the stream himself: at least one character, the
-/// first no marker, and no newline.
+/// line. For callers that then write to the stream themselves: at least one
+/// character, the first no marker, and no newline.
 void output_begin_text();
 
 /// Gives up a record that was opened and will not be closed: the sink is
