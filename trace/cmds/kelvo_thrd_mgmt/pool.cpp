@@ -39,7 +39,7 @@ constexpr uint32_t FEWEST_FREE_THREADS = 3; // beyond those that waiting tasks w
 
 // Microseconds.
 constexpr int64_t IDLE_INTERVAL = 1500;
-constexpr int64_t LONGEST_IDLE_INTERVAL = 10000;
+constexpr int64_t LONGEST_IDLE_INTERVAL = 100000; // nothing depends on it: a task wakes at once
 constexpr int64_t CLOSE_INTERVAL = 10000;
 constexpr int CLOSE_ATTEMPTS = 10;
 
