@@ -91,6 +91,24 @@ TEST(Walk, positions_without_a_whole_header_are_out_of_bounds) {
     }
 }
 
+TEST(Walk, no_record_stands_on_the_words_that_the_reader_writes) {
+    raw_trace raw(400);
+    raw.header.uOffset = offsetof(trace_file_header, uSeqLock); // a filler of uSeqLock bytes
+    raw.header.uSeqLock = 100;
+    raw.header.uOldestRecordOffset = 200;
+    raw.put(200, {.seqNumber = 100, .length = 200});
+    memory_trace trace(raw);
+    EXPECT_EQ(step(trace.stand_on(200)),
+              (answer{WALK_CORRUPT, out_of_bounds_warning(trace.file, raw.header.uOffset)}));
+    EXPECT_EQ(trace.file.pHeader->uSeqLock, 100U) << "not passed";
+
+    raw.header.uOffset = offsetof(trace_file_header, uTailReq) + sizeof(uint32_t);
+    raw.uHeaderBytes = raw.header.uOffset; // the record's time stamp ends in uOldestRecordOffset
+    raw.put(raw.header.uOffset, {.timeStamp = 200ULL << 32, .length = 100});
+    memory_trace behind(raw);
+    EXPECT_EQ(ask(behind, raw.header.uOffset), (answer{WALK_RECORD, ""}));
+}
+
 TEST(Walk, knows_that_it_has_caught_up_and_says_when_the_ring_is_inconsistent) {
     raw_trace raw(400);
     raw.header.uSeqLock = 10;

@@ -42,3 +42,10 @@ inline bool ring_holds_header(const trace_file* pTraceFile, uint64_t uOffset) {
     return uOffset >= ring_start(pTraceFile) && uOffset <= uEnd &&
            uEnd - uOffset >= sizeof(trace_record_header);
 }
+
+/// Whether a record at `uOffset` covers the words of the file header that the
+/// reader writes, as in a damaged file whose record area begins inside its
+/// header. Such a record changes while it is walked over.
+inline bool ring_covers_reader_words(uint64_t uOffset) {
+    return uOffset < offsetof(trace_file_header, uTailReq) + sizeof(trace_file_header::uTailReq);
+}

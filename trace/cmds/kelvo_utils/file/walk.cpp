@@ -130,12 +130,19 @@ int record_is_bad(const trace_record_header* pRec, const trace_record_header& he
 
 int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_header* pHeader) {
     const trace_record_header* const pRec = pTraceFile->pCurRec;
-    if (!ring_holds_header(pTraceFile, ring_offset(pTraceFile, pRec))) [[unlikely]] {
+    const uint64_t uOffset = ring_offset(pTraceFile, pRec);
+    if (!ring_holds_header(pTraceFile, uOffset)) [[unlikely]] {
         warn_out_of_bounds(pTraceFile, pRec);
         return 1;
     }
     *pHeader = read_record_header(pRec);
-    return record_is_bad(pRec, *pHeader, pTraceFile);
+    if (record_is_bad(pRec, *pHeader, pTraceFile))
+        return 1;
+    if (ring_covers_reader_words(uOffset)) [[unlikely]] {
+        warn_out_of_bounds(pTraceFile, pRec);
+        return 1;
+    }
+    return 0;
 }
 
 walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader) {
