@@ -6,20 +6,16 @@
 #include "raw_trace.h"
 #include "ring.h"
 
-#include <cstring>
-#include <memory>
+#include <algorithm>
 #include <string>
 
 class memory_trace {
 public:
-    explicit memory_trace(const raw_trace& trace) {
-        const std::vector<std::byte> bytes = trace.bytes();
-        pBytes = std::make_unique<std::byte[]>(bytes.size());
-        memcpy(pBytes.get(), bytes.data(), bytes.size());
+    explicit memory_trace(const raw_trace& trace) : content(trace.bytes()) {
+        content.shrink_to_fit();
         file.pName = name.data();
-        file.fd = -1;
-        file.uSize = static_cast<uint32_t>(bytes.size());
-        file.pHeader = reinterpret_cast<trace_file_header*>(pBytes.get());
+        file.uSize = static_cast<uint32_t>(content.size());
+        file.pHeader = reinterpret_cast<trace_file_header*>(content.data());
         file.pMapEnd = ring_position(&file, file.uSize);
         file.pWrap = ring_position(&file, trace.header.uOffset);
         file.pCurRec = file.pWrap;
@@ -37,28 +33,31 @@ public:
     }
 
     void put(uint32_t uAt, const raw_record& record) {
-        const std::vector<std::byte> bytes = raw_record_bytes(record);
-        memcpy(pBytes.get() + uAt, bytes.data(), bytes.size());
-    }
-
-    std::vector<std::byte> bytes() const {
-        return {pBytes.get(), pBytes.get() + file.uSize};
+        std::ranges::copy(raw_record_bytes(record), content.begin() + uAt);
     }
 
     std::string name = "ring.trc";
     trace_file file{};
 
 private:
-    std::unique_ptr<std::byte[]> pBytes;
+    std::vector<std::byte> content;
 };
+
+inline const std::string GIVING_UP =
+    "WARNING: Irrecoverable corruption detected (giving up on the rest of this file): ";
+
+/// The warning that something of the record at offset 200 is not valid.
+inline std::string record_warning(const std::string& what, const std::string& found) {
+    return GIVING_UP + "invalid record " + what + ": file(ring.trc) record_offset(0x000000c8) " +
+           found + "\n";
+}
 
 /// The text of an out-of-bounds warning for the position at `uOffset`.
 inline std::string out_of_bounds_warning(const trace_file& file, uint64_t uOffset) {
     char text[400];
     snprintf(text, sizeof(text),
-             "WARNING: Irrecoverable corruption detected (giving up on the rest of this file): "
-             "pCurRec out of bounds: file(%s) pHeader(%p) pCurRec(%p) pMapEnd(%p).\n",
-             file.pName, static_cast<void*>(file.pHeader),
-             static_cast<void*>(ring_position(&file, uOffset)), static_cast<void*>(file.pMapEnd));
-    return text;
+             "pCurRec out of bounds: file(%s) pHeader(%p) pCurRec(%p) pMapEnd(%p).\n", file.pName,
+             static_cast<void*>(file.pHeader), static_cast<void*>(ring_position(&file, uOffset)),
+             static_cast<void*>(file.pMapEnd));
+    return GIVING_UP + text;
 }
