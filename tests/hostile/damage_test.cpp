@@ -1,13 +1,16 @@
 // Files cut at every length and with every bit flipped: what stands before the
 // damage is written as in the sound file, and so is what stands behind damage
 // that does not lead the walk astray.
+#include "hostile_harness.h"
 #include "hostile_samples.h"
-#include "written_records.h"
+#include "stdout_stream.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <cstring>
+#include <sys/mman.h>
+#include <unistd.h>
 
 namespace {
 
@@ -23,56 +26,70 @@ protected:
     }
 };
 
-TEST_F(Damage, SoundFilesAreWrittenWhole) {
-    const written_file kinds = write_records_of(full_ring_of(SAMPLE_KINDS).bytes());
-    EXPECT_TRUE(kinds.result.bAccepted);
-    EXPECT_EQ(kinds.result.end, hostile_end::NO_MORE);
-    EXPECT_EQ(kinds.records.size(), 17U); // neither restarts nor notices of discarded records
-    const written_file wrapped = write_records_of(wrapped_ring(1024).bytes());
-    EXPECT_EQ(wrapped.result.end, hostile_end::NO_MORE);
-    ASSERT_GT(wrapped.records.size(), 15U);
-    EXPECT_GT(wrapped.records.front().uOffset, wrapped.records.back().uOffset);
+struct written_record {
+    uint32_t uOffset = 0; ///< in the file
+    uint32_t uLength = 0; ///< as far as it lies in the file
+    std::string text{};
+
+    size_t end() const {
+        return size_t{uOffset} + uLength;
+    }
+    friend bool operator==(const written_record&, const written_record&) = default;
+};
+
+/// What was written to the file in memory since the last call.
+std::string take_text(int fd) {
+    stdout_flush();
+    std::string text(static_cast<size_t>(lseek(fd, 0, SEEK_CUR)), '\0');
+    hostile_check(pread(fd, text.data(), text.size(), 0) == std::ssize(text) &&
+                      ftruncate(fd, 0) == 0 && lseek(fd, 0, SEEK_SET) == 0,
+                  "output can be read back");
+    return text;
 }
 
-/// The records that end at `uEnd` or before.
-std::vector<written_record> whole_records_before(const std::vector<written_record>& records,
-                                                 size_t uEnd) {
-    std::vector<written_record> whole;
-    for (const written_record& record : records)
-        if (record.uOffset + record.uLength <= uEnd)
-            whole.push_back(record);
-    return whole;
+/// Reads the file and writes each record in the forms.
+std::pair<hostile_result, std::vector<written_record>>
+write_records_of(trace_bytes file, uint8_t uForms = FORM_TEMPLATE) {
+    static const int fdText = memfd_create("output", MFD_CLOEXEC);
+    std::vector<written_record> written;
+    hostile_options options;
+    options.uForms = uForms;
+    options.onWritten = [&written](const trace_queue_element& element) {
+        written.push_back({element.offset, element.header.length, take_text(fdText)});
+    };
+    const redirected_output redirected(fdText);
+    const hostile_result result = read_hostile_file(file, options);
+    return {result, written};
 }
 
+/// As it is, and when it claims to be whole.
 TEST_F(Damage, EveryPrefix) {
     const std::vector<std::byte> sound = full_ring_of(SAMPLE_KINDS).bytes();
-    for (size_t uSize = 0; uSize < sound.size(); ++uSize) {
-        const written_file cut = write_records_of(trace_bytes(sound).first(uSize));
-        ASSERT_FALSE(cut.result.bAccepted) << uSize;
-        ASSERT_EQ(cut.result.end == hostile_end::TOO_SMALL, uSize < AREA) << uSize;
-    }
-}
-
-TEST_F(Damage, EveryPrefixThatClaimsToBeWhole) {
-    const std::vector<std::byte> sound = full_ring_of(SAMPLE_KINDS).bytes();
-    const std::vector<written_record> records = write_records_of(sound, FORM_ALL).records;
-    for (size_t uSize = AREA; uSize < sound.size(); ++uSize) {
-        std::vector<std::byte> file(sound.begin(), sound.begin() + static_cast<ptrdiff_t>(uSize));
-        const auto uActualFileSize = static_cast<uint32_t>(uSize);
-        memcpy(file.data() + offsetof(trace_file_header, uActualFileSize), &uActualFileSize,
-               sizeof(uActualFileSize));
-        const written_file cut = write_records_of(file, FORM_ALL);
-        ASSERT_EQ(cut.result.bAccepted, uSize >= AREA + HEADER) << uSize;
+    const auto [result, records] = write_records_of(sound, FORM_ALL);
+    ASSERT_TRUE(result.bAccepted);
+    ASSERT_EQ(result.end, hostile_end::NO_MORE);
+    ASSERT_EQ(records.size(), 17U); // neither restarts nor notices of discarded records
+    for (uint32_t uSize = 0; uSize < sound.size(); ++uSize) {
+        std::vector<std::byte> file(sound.begin(), sound.begin() + uSize);
+        const hostile_result asItIs = write_records_of(file, FORM_ALL).first;
+        ASSERT_FALSE(asItIs.bAccepted) << uSize;
+        ASSERT_EQ(asItIs.end == hostile_end::TOO_SMALL, uSize < AREA) << uSize;
+        if (uSize < AREA)
+            continue;
+        memcpy(file.data() + offsetof(trace_file_header, uActualFileSize), &uSize, sizeof(uSize));
+        const auto [cut, written] = write_records_of(file, FORM_ALL);
+        ASSERT_EQ(cut.bAccepted, uSize >= AREA + HEADER) << uSize;
 
         // The whole records, and then perhaps the one that is cut.
-        const std::vector<written_record> whole = whole_records_before(records, uSize);
-        ASSERT_LE(whole.size(), cut.records.size()) << uSize;
-        ASSERT_LE(cut.records.size(), whole.size() + 1) << uSize;
-        ASSERT_TRUE(std::equal(whole.begin(), whole.end(), cut.records.begin())) << uSize;
-        if (cut.records.size() > whole.size()) {
-            const written_record& last = cut.records.back();
-            ASSERT_EQ(last.uOffset + last.uLength, uSize);
-            ASSERT_EQ(cut.result.end, hostile_end::CORRUPT) << uSize;
+        const auto pCut = std::find_if(records.begin(), records.end(),
+                                       [&](const auto& record) { return record.end() > uSize; });
+        const std::vector<written_record> whole(records.begin(), pCut);
+        ASSERT_LE(whole.size(), written.size()) << uSize;
+        ASSERT_LE(written.size(), whole.size() + 1) << uSize;
+        ASSERT_TRUE(std::equal(whole.begin(), whole.end(), written.begin())) << uSize;
+        if (written.size() > whole.size()) {
+            ASSERT_EQ(written.back().end(), uSize);
+            ASSERT_EQ(cut.end, hostile_end::CORRUPT) << uSize;
         }
     }
 }
@@ -107,12 +124,15 @@ damage_site find_site(const std::vector<written_record>& records, uint32_t uGapA
 TEST_F(Damage, EveryBit) {
     const raw_trace ring = wrapped_ring(1024);
     std::vector<std::byte> file = ring.bytes();
-    const std::vector<written_record> records = write_records_of(file).records;
+    const auto [result, records] = write_records_of(file);
+    ASSERT_EQ(result.end, hostile_end::NO_MORE);
+    ASSERT_GT(records.size(), 15U);
+    ASSERT_GT(records.front().uOffset, records.back().uOffset);
     const uint32_t uGapAt = ring.header.uOldestRecordOffset;
     for (size_t uBit = 0; uBit < file.size() * 8; ++uBit) {
         const auto mask = static_cast<std::byte>(1U << uBit % 8);
         file[uBit / 8] ^= mask;
-        std::vector<written_record> written = write_records_of(file).records;
+        std::vector<written_record> written = write_records_of(file).second;
         file[uBit / 8] ^= mask;
 
         const damage_site site = find_site(records, uGapAt, uBit / 8);

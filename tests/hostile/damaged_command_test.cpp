@@ -26,9 +26,8 @@ std::vector<std::byte> damaged(std::vector<std::byte> file, std::mt19937& random
     for (size_t uChanges = 1 + below(4); uChanges > 0; --uChanges) {
         const size_t uLimit = below(2) == 0 ? sizeof(trace_file_header) + 64 : file.size();
         constexpr uint8_t VALUES[] = {0x00, 0x01, 0x1C, 0x7F, 0x80, 0xFF};
-        const bool bEdge = below(2) == 0;
         const auto value =
-            bEdge ? VALUES[below(std::size(VALUES))] : static_cast<uint8_t>(random());
+            below(2) == 0 ? VALUES[below(std::size(VALUES))] : static_cast<uint8_t>(random());
         file[below(std::min(uLimit, file.size()))] = std::byte{value};
     }
     if (below(4) == 0) {
