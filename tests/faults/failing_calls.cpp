@@ -71,19 +71,28 @@ using thread_body = void* (*)(void*);
 } // namespace
 
 #ifdef KELVO_WRAPPED_CALLS
+#define OURS(name) __wrap_##name
+#define REAL(name) __real_##name
+#else
+#define OURS(name) name
+#define REAL(name) __libc_##name
+#endif
 
-// NAME becomes a call of the wrapped function that fails as the real one does.
+// NAME becomes a call of the real function that fails as that one does.
 #define FAILING(result, name, parameters, arguments)                                               \
-    result __real_##name parameters;                                                               \
-    result __wrap_##name parameters;                                                               \
-    result __wrap_##name parameters {                                                              \
-        return fails(allocations) ? nullptr : __real_##name arguments;                             \
+    result REAL(name) parameters;                                                                  \
+    result OURS(name) parameters;                                                                  \
+    result OURS(name) parameters {                                                                 \
+        return fails(allocations) ? nullptr : REAL(name) arguments;                                \
     }
 
 extern "C" {
 FAILING(void*, malloc, (size_t size), (size))
 FAILING(void*, calloc, (size_t count, size_t size), (count, size))
 FAILING(void*, realloc, (void* pBlock, size_t size), (pBlock, size))
+
+#ifdef KELVO_WRAPPED_CALLS
+
 FAILING(void*, aligned_alloc, (size_t alignment, size_t size), (alignment, size))
 FAILING(char*, strdup, (const char* pText), (pText))
 FAILING(DIR*, opendir, (const char* pName), (pName))
@@ -108,43 +117,26 @@ int __wrap_asprintf(char** ppText, const char* pFormat, ...) {
 
 int __real_pthread_create(pthread_t*, const pthread_attr_t*, thread_body, void*);
 int __wrap_pthread_create(pthread_t*, const pthread_attr_t*, thread_body, void*);
-int __wrap_pthread_create(pthread_t* pId, const pthread_attr_t* pAttributes, thread_body body,
-                          void* pArgument) {
-    return fails(threads) ? EAGAIN : __real_pthread_create(pId, pAttributes, body, pArgument);
-}
-}
 
 #else
 
-extern "C" {
-void* __libc_malloc(size_t size);
-void* __libc_calloc(size_t count, size_t size);
-void* __libc_realloc(void* pBlock, size_t size);
 void* __libc_memalign(size_t alignment, size_t size);
-
-void* malloc(size_t size) {
-    return fails(allocations) ? nullptr : __libc_malloc(size);
-}
-
-void* calloc(size_t count, size_t size) {
-    return fails(allocations) ? nullptr : __libc_calloc(count, size);
-}
-
-void* realloc(void* pBlock, size_t size) {
-    return fails(allocations) ? nullptr : __libc_realloc(pBlock, size);
-}
 
 void* aligned_alloc(size_t alignment, size_t size) {
     return fails(allocations) ? nullptr : __libc_memalign(alignment, size);
 }
 
-int pthread_create(pthread_t* pId, const pthread_attr_t* pAttributes, thread_body body,
-                   void* pArgument) {
-    using create_function = int (*)(pthread_t*, const pthread_attr_t*, thread_body, void*);
+static int __libc_pthread_create(pthread_t* pId, const pthread_attr_t* pAttributes,
+                                 thread_body body, void* pArgument) {
     static const auto create =
-        reinterpret_cast<create_function>(dlsym(RTLD_NEXT, "pthread_create"));
-    return fails(threads) ? EAGAIN : create(pId, pAttributes, body, pArgument);
-}
+        reinterpret_cast<decltype(&pthread_create)>(dlsym(RTLD_NEXT, "pthread_create"));
+    return create(pId, pAttributes, body, pArgument);
 }
 
 #endif
+
+int OURS(pthread_create)(pthread_t* pId, const pthread_attr_t* pAttributes, thread_body body,
+                         void* pArgument) {
+    return fails(threads) ? EAGAIN : REAL(pthread_create)(pId, pAttributes, body, pArgument);
+}
+}

@@ -33,30 +33,27 @@ uint32_t value_of(size_t uFile, uint32_t uRecord) {
 }
 
 /// Among the counted records one of each kind that needs more than the others.
-bool write_trace(const std::string& path, size_t uFile, uint64_t uFirstTime) {
+void write_trace(const std::string& path, size_t uFile, uint64_t uFirstTime) {
     trace_writer writer;
-    bool bWritten = writer.create(path.c_str()) == TRACE_WRITER_OK;
+    ASSERT_EQ(writer.create(path.c_str()), TRACE_WRITER_OK);
     uint64_t uTime = uFirstTime;
     const auto origin = [&](uint32_t uThread) {
         return trace_origin{"_FLT", uThread, uTime += 1000};
     };
     for (uint32_t uRecord = 0; uRecord < RECORDS; ++uRecord)
-        bWritten &= writer.append_uint32(origin(uRecord % 3), 1, value_of(uFile, uRecord)) == 0;
+        writer.append_uint32(origin(uRecord % 3), 1, value_of(uFile, uRecord));
     const std::string_view strings[] = {"Anna", "seven"};
-    const uint32_t number = 7;
-    const trace_bytes blocks[] = {std::as_bytes(std::span(&number, 1)),
-                                  std::as_bytes(std::span(strings[0]))};
+    const std::vector<std::byte> number = raw_bytes(7U);
+    const trace_bytes blocks[] = {number, std::as_bytes(std::span(strings[0]))};
     const std::string sLong(5000, 'x');
-    bWritten &= writer.append_strings(origin(1), 2, strings) == TRACE_WRITER_OK;
-    bWritten &= writer.append_data(origin(1), 3, blocks) == TRACE_WRITER_OK;
     trace_error_content error;
     error.traceId = 4;
-    error.funcName = "open";
-    error.fileName = "a.c";
     error.msgCatName = "none.cat";
     error.defMsg = sLong;
-    bWritten &= writer.append_error(origin(1), error) == TRACE_WRITER_OK;
-    return bWritten;
+    writer.append_strings(origin(1), 2, strings);
+    writer.append_data(origin(1), 3, blocks);
+    writer.append_error(origin(1), error);
+    ASSERT_EQ(writer.counts().uAppended, RECORDS + 3);
 }
 
 /// The number that follows the text, or -1.
@@ -126,73 +123,65 @@ void expect_only_reader_words(const std::vector<std::byte>& before,
     EXPECT_TRUE(blanked == before) << "more than two words were written into a trace file";
 }
 
-fault_sample::fault_sample() : m_template(m_dir.file("_FLT.tpl")) {
+fault_sample::fault_sample() : sTemplates(dir.file("_FLT.tpl")) {
     constexpr uint64_t FIRST_TIMES[] = {0, 6'500}; // the second file's begins among the first one's
     for (size_t uFile = 0; uFile < 2; ++uFile) {
-        m_files[uFile] = m_dir.file(uFile == 0 ? "a.trc" : "b.trc");
-        EXPECT_TRUE(write_trace(m_files[uFile], uFile, FIRST_TIMES[uFile]));
-        m_before[uFile] = read_file(m_files[uFile]);
+        files[uFile] = dir.file(uFile == 0 ? "a.trc" : "b.trc");
+        write_trace(files[uFile], uFile, FIRST_TIMES[uFile]);
+        before[uFile] = read_file(files[uFile]);
     }
-    EXPECT_TRUE(write_file(m_template, std::as_bytes(std::span(TEMPLATES, sizeof TEMPLATES - 1))));
+    EXPECT_TRUE(write_file(sTemplates, std::as_bytes(std::span(TEMPLATES, sizeof TEMPLATES - 1))));
 }
 
 std::vector<std::string> fault_sample::arguments(const std::vector<std::string>& options) const {
     std::vector<std::string> result = options;
-    result.insert(result.end(), {"-t", m_dir.path(), m_files[0], m_files[1]});
+    result.insert(result.end(), {"-t", dir.path(), files[0], files[1]});
     return result;
 }
 
-size_t fault_sample::printed(size_t uIndex, const std::string& sOut) const {
-    size_t uPrinted = 0;
+bool fault_sample::is_whole(size_t uIndex, const std::string& sOut) const {
     for (uint32_t uRecord = 0; uRecord < RECORDS; ++uRecord) {
         char value[16];
         snprintf(value, sizeof value, "0x%08x", value_of(uIndex, uRecord));
-        uPrinted += sOut.find(value) != std::string::npos;
+        if (sOut.find(value) == std::string::npos)
+            return false;
     }
-    return uPrinted;
-}
-
-bool fault_sample::is_whole(size_t uIndex, const std::string& sOut) const {
-    return printed(uIndex, sOut) == RECORDS;
+    return true;
 }
 
 void fault_sample::expect_honest(const command_result& result) const {
     expect_sound_end(result);
-    bool bWhole[2];
-    for (size_t uFile = 0; uFile < 2; ++uFile) {
-        bWhole[uFile] = is_whole(uFile, result.sOut);
-        expect_only_reader_words(m_before[uFile], read_file(m_files[uFile]));
-    }
     const bool bExplained = result.status == 1 ||
                             result.sOut.find(": 2625-1") != std::string::npos ||
                             result.sErr.find(": 2625-1") != std::string::npos;
     for (size_t uFile = 0; uFile < 2; ++uFile) {
-        const bool bNamed = result.sErr.find(m_files[uFile]) != std::string::npos;
-        EXPECT_TRUE(bWhole[uFile] || bNamed || bExplained)
+        expect_only_reader_words(before[uFile], read_file(files[uFile]));
+        const bool bNamed = result.sErr.find(files[uFile]) != std::string::npos;
+        EXPECT_TRUE(bExplained || bNamed || is_whole(uFile, result.sOut))
             << "records of file " << uFile << " are missing and nothing is said\n"
             << result.sOut << result.sErr;
     }
     expect_counted(result);
 }
 
-void fault_sweep::sweep(size_t uEnd, const make_run& make, const check_run& check) {
+void sweep_faults(size_t uEnd, const std::function<fault_run(size_t, const fault_sample&)>& make,
+                  const std::function<bool(size_t, const fault_sample&, command_result&)>& check) {
+    constexpr size_t AT_ONCE = 6;
     struct slot {
         fault_sample sample;
         std::unique_ptr<live_command> pCommand{};
     };
-    for (size_t uFirst = 0; uFirst < uEnd; uFirst += AT_ONCE) {
-        const size_t uCount = std::min(AT_ONCE, uEnd - uFirst);
-        const auto pSlots = std::make_unique<slot[]>(uCount);
-        for (size_t i = 0; i < uCount; ++i) {
-            const run made = make(uFirst + i, pSlots[i].sample);
-            pSlots[i].pCommand = std::make_unique<live_command>(made.arguments, made.setup);
+    bool bGoesOn = true;
+    for (size_t uFirst = 0; bGoesOn && uFirst < uEnd; uFirst += AT_ONCE) {
+        std::vector<slot> slots(std::min(AT_ONCE, uEnd - uFirst));
+        for (size_t i = 0; i < slots.size(); ++i) {
+            const fault_run made = make(uFirst + i, slots[i].sample);
+            slots[i].pCommand = std::make_unique<live_command>(made.arguments, made.setup);
         }
-        for (size_t i = 0; i < uCount; ++i) {
-            command_result result = pSlots[i].pCommand->wait();
-            check(uFirst + i, pSlots[i].sample, result);
+        for (size_t i = 0; i < slots.size(); ++i) {
+            command_result result = slots[i].pCommand->wait();
+            bGoesOn &= check(uFirst + i, slots[i].sample, result) && !testing::Test::HasFailure();
         }
-        if (testing::Test::HasFailure())
-            return; // the next ones would say the same
     }
 }
 

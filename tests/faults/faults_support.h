@@ -39,25 +39,13 @@ void expect_only_reader_words(const std::vector<std::byte>& before,
 /// The two files, the directory of their templates, and what stands in them.
 /// The first file is read first; the second one's time comes halfway through
 /// it, so that its reader is started by the other reader.
-class fault_sample {
-public:
+struct fault_sample {
     fault_sample();
-
-    const std::string& file(size_t uIndex) const {
-        return m_files[uIndex];
-    }
-    const std::string& template_file() const {
-        return m_template;
-    }
-    const std::string& directory() const {
-        return m_dir.path();
-    }
 
     /// `options`, then the templates' directory, then both files.
     std::vector<std::string> arguments(const std::vector<std::string>& options = {}) const;
 
-    /// How many records of the file stand in the text, by a template or without.
-    size_t printed(size_t uIndex, const std::string& sOut) const;
+    /// Whether all records of the file stand in the text, by a template or without.
     bool is_whole(size_t uIndex, const std::string& sOut) const;
 
     /// What holds of every run over the two files: it ends soundly; no record
@@ -66,31 +54,22 @@ public:
     /// trace files are as they were.
     void expect_honest(const command_result& result) const;
 
-private:
-    temp_dir m_dir;
-    std::string m_files[2];
-    std::string m_template;
-    std::vector<std::byte> m_before[2];
+    temp_dir dir;
+    std::string files[2];
+    std::string sTemplates; ///< the file
+    std::vector<std::byte> before[2];
 };
 
-/// Runs that go on at the same time, each over a sample of its own: most of
-/// their time they wait.
-class fault_sweep {
-public:
-    struct run {
-        std::vector<std::string> arguments;
-        command_setup setup;
-    };
-    using make_run = std::function<run(size_t uNumber, const fault_sample& sample)>;
-    using check_run =
-        std::function<void(size_t uNumber, const fault_sample& sample, command_result& result)>;
-
-    /// Makes and checks the runs from number 0 on, up to but not including `uEnd`.
-    void sweep(size_t uEnd, const make_run& make, const check_run& check);
-
-private:
-    static constexpr size_t AT_ONCE = 6;
+struct fault_run {
+    std::vector<std::string> arguments;
+    command_setup setup;
 };
+
+/// Makes and checks the runs from number 0 on, up to but not including `uEnd`, or
+/// until a check fails or returns false. Each has a sample of its own, and some go
+/// on at the same time: most of their time they wait.
+void sweep_faults(size_t uEnd, const std::function<fault_run(size_t, const fault_sample&)>& make,
+                  const std::function<bool(size_t, const fault_sample&, command_result&)>& check);
 
 /// Runs kelvo_sample with these options into `directory`. Returns the paths of
 /// the trace files, in order.

@@ -28,16 +28,18 @@ command_setup traced_setup() {
     return setup;
 }
 
-bool can_trace() {
-    if (std::string(KELVO_STRACE).empty())
-        return false;
-    static const bool bCan =
-        run_command({"-qq", "-o", "/dev/null", KELVO_PROGRAM, "-h"}, traced_setup()).status == 0;
-    return bCan;
+/// Its arguments: where it writes its log, its options, then the command with its own.
+std::vector<std::string> traced(const std::string& sLog, const std::vector<std::string>& options,
+                                const std::vector<std::string>& command) {
+    std::vector<std::string> arguments{"-qq", "-o", sLog};
+    arguments.insert(arguments.end(), options.begin(), options.end());
+    arguments.emplace_back(KELVO_PROGRAM);
+    arguments.insert(arguments.end(), command.begin(), command.end());
+    return arguments;
 }
 
 std::string log_of(const fault_sample& sample) {
-    return sample.directory() + "/calls";
+    return sample.dir.path() + "/calls";
 }
 
 std::vector<std::string> read_lines(const std::string& path) {
@@ -51,21 +53,22 @@ std::vector<std::string> read_lines(const std::string& path) {
 class SystemCall : public testing::Test {
 protected:
     void SetUp() override {
-        if (!can_trace())
+        if (*KELVO_STRACE == '\0' ||
+            run_command(traced("/dev/null", {}, {"-h"}), traced_setup()).status != 0)
             GTEST_SKIP() << "strace is not there or may not trace";
     }
 };
 
 // ---------------------------------------------------- one call on one file
 
-enum class part : char { NOTHING, FIRST_FILE, SECOND_FILE, BOTH_FILES };
+enum part : unsigned { NOTHING = 0, SECOND_FILE = 2, BOTH_FILES = 3 };
 
 /// One failing call on the first trace file, or on the template file.
 struct failing_call {
     const char* pCall;
     const char* pError;
     int iWhen; ///< its number among the calls on that file, per thread
-    part whole = part::BOTH_FILES;
+    part whole = BOTH_FILES;
     int status = 0;
     const char* pOut = ""; ///< what standard output contains
     const char* pErr = ""; ///< what standard error is; the name of the first file for "FILE"
@@ -84,29 +87,29 @@ constexpr char NOT_MAPPED[] = "2625-180 Either file permissions are too restrict
 
 // A second time on the file: when its turn to be read has come.
 const failing_call FAILING_CALLS[] = {
-    {"?access,?faccessat", "EACCES", 1, part::NOTHING, 1, "",
+    {"?access,?faccessat", "EACCES", 1, NOTHING, 1, "",
      "2625-101 Filename \"FILE\" is not accessible, Permission denied\n"},
-    {"openat", "EMFILE", 1, part::SECOND_FILE, 1, "",
+    {"openat", "EMFILE", 1, SECOND_FILE, 1, "",
      "2625-102 Error opening file \"FILE\", Too many open files\n"},
-    {"openat", "ENOENT", 2, part::SECOND_FILE, 0, "",
+    {"openat", "ENOENT", 2, SECOND_FILE, 0, "",
      "2625-102 Error opening file \"FILE\", No such file or directory\n"},
-    {"fcntl", "EAGAIN", 1, part::SECOND_FILE, 1, IN_USE},
-    {"fcntl", "EACCES", 2, part::SECOND_FILE, 0, IN_USE},
-    {"fcntl", "ENOLCK", 1, part::SECOND_FILE, 1, "",
+    {"fcntl", "EAGAIN", 1, SECOND_FILE, 1, IN_USE},
+    {"fcntl", "EACCES", 2, SECOND_FILE, 0, IN_USE},
+    {"fcntl", "ENOLCK", 1, SECOND_FILE, 1, "",
      "2625-162 Error returned from fcntl() attempting to lock trace file,  No locks available\n"},
-    {STAT, "EIO", 1, part::SECOND_FILE, 1, "",
+    {STAT, "EIO", 1, SECOND_FILE, 1, "",
      "2625-104 Error retrieving information about file \"FILE\",  Input/output error\n"},
-    {"mmap", "ENOMEM", 1, part::SECOND_FILE, 1, MARKER, NO_MEMORY},
-    {"mmap", "EAGAIN", 2, part::SECOND_FILE, 0, MARKER, NO_MEMORY},
-    {"mmap", "EACCES", 1, part::SECOND_FILE, 1, NOT_MAPPED},
+    {"mmap", "ENOMEM", 1, SECOND_FILE, 1, MARKER, NO_MEMORY},
+    {"mmap", "EAGAIN", 2, SECOND_FILE, 0, MARKER, NO_MEMORY},
+    {"mmap", "EACCES", 1, SECOND_FILE, 1, NOT_MAPPED},
     {"close", "EIO", 1},
     {"close", "EINTR", 1},
     {"utimensat", "EPERM", 1},
-    {"openat", "EMFILE", 1, part::BOTH_FILES, 0, "", "", true},
-    {"openat", "EACCES", 1, part::BOTH_FILES, 0, "", "", true, {"-l"}},
-    {STAT, "EIO", 1, part::BOTH_FILES, 0, "", "", true},
-    {"read", "EIO", 1, part::BOTH_FILES, 0, "", "", true},
-    {"read", "EINTR", 1, part::BOTH_FILES, 0, "", "", true, {"-l"}},
+    {"openat", "EMFILE", 1, BOTH_FILES, 0, "", "", true},
+    {"openat", "EACCES", 1, BOTH_FILES, 0, "", "", true, {"-l"}},
+    {STAT, "EIO", 1, BOTH_FILES, 0, "", "", true},
+    {"read", "EIO", 1, BOTH_FILES, 0, "", "", true},
+    {"read", "EINTR", 1, BOTH_FILES, 0, "", "", true, {"-l"}},
 };
 
 std::string with_name(std::string sText, const std::string& sName) {
@@ -127,27 +130,19 @@ int left_open(const std::vector<std::string>& log) {
 }
 
 TEST_F(SystemCall, OnAFileMayFail) {
-    fault_sweep{}.sweep(
+    sweep_faults(
         std::size(FAILING_CALLS),
         [](size_t uCase, const fault_sample& sample) {
             const failing_call& call = FAILING_CALLS[uCase];
             const std::string sCall = call.pCall;
-            const std::string sFile = call.bTemplate ? sample.template_file() : sample.file(0);
-            std::vector<std::string> arguments = {
-                "-f",
-                "-qq",
-                "-o",
-                log_of(sample),
-                "-P",
-                sFile,
-                "-e",
-                "trace=openat,close," + sCall,
-                "-e",
-                "inject=" + sCall + ":error=" + call.pError + ":when=" + std::to_string(call.iWhen),
-                KELVO_PROGRAM};
-            for (std::string& sArgument : sample.arguments(call.options))
-                arguments.push_back(std::move(sArgument));
-            return fault_sweep::run{std::move(arguments), traced_setup()};
+            const std::string sFile = call.bTemplate ? sample.sTemplates : sample.files[0];
+            const std::string sInject =
+                "inject=" + sCall + ":error=" + call.pError + ":when=" + std::to_string(call.iWhen);
+            return fault_run{
+                traced(log_of(sample),
+                       {"-f", "-P", sFile, "-e", "trace=openat,close," + sCall, "-e", sInject},
+                       sample.arguments(call.options)),
+                traced_setup()};
         },
         [](size_t uCase, const fault_sample& sample, const command_result& result) {
             const failing_call& call = FAILING_CALLS[uCase];
@@ -155,11 +150,10 @@ TEST_F(SystemCall, OnAFileMayFail) {
                          std::to_string(call.iWhen));
             sample.expect_honest(result);
             EXPECT_EQ(result.status, call.status);
-            const auto whole = static_cast<unsigned>(call.whole);
-            EXPECT_EQ(sample.is_whole(0, result.sOut), (whole & 1U) != 0);
-            EXPECT_EQ(sample.is_whole(1, result.sOut), (whole & 2U) != 0);
-            EXPECT_THAT(result.sOut, HasSubstr(with_name(call.pOut, sample.file(0))));
-            std::string sErr = with_name(call.pErr, sample.file(0));
+            EXPECT_EQ(sample.is_whole(0, result.sOut), (call.whole & 1U) != 0);
+            EXPECT_EQ(sample.is_whole(1, result.sOut), (call.whole & 2U) != 0);
+            EXPECT_THAT(result.sOut, HasSubstr(with_name(call.pOut, sample.files[0])));
+            std::string sErr = with_name(call.pErr, sample.files[0]);
             if (sErr.starts_with("2625-"))
                 sErr.insert(0, std::string(KELVO_PROGRAM) + ": ");
             EXPECT_EQ(result.sErr, sErr);
@@ -167,6 +161,7 @@ TEST_F(SystemCall, OnAFileMayFail) {
             const std::vector<std::string> log = read_lines(log_of(sample));
             EXPECT_THAT(log, testing::Contains(HasSubstr("INJECTED")));
             EXPECT_EQ(left_open(log), 0) << "a descriptor was left open";
+            return true;
         });
 }
 
@@ -176,37 +171,17 @@ TEST_F(SystemCall, OnAFileMayFail) {
 /// counted from the beginning of the program itself, in each thread. munmap is
 /// tried on the two files alone: the C library itself ends a process that cannot
 /// release the stack of a thread.
-struct counted_call {
-    const char* pCall;
-    std::vector<const char*> errors;
-};
-
-const counted_call COUNTED_CALLS[] = {
-    {"mmap", {"ENOMEM"}},
-    {"munmap", {"ENOMEM"}},
-    {"mprotect", {"ENOMEM"}},
-    {"brk", {"ENOMEM"}},
-    {"clone3", {"EAGAIN"}},
-    {"rt_sigprocmask", {"EINVAL"}},
-    {"rt_sigaction", {"EINVAL"}},
-    {"write", {"ENOSPC", "EINTR", "EAGAIN", "EIO"}},
-    {"ppoll", {"EINTR", "ENOMEM"}},
-    {"poll", {"EINTR"}},
-    {"clock_nanosleep", {"EINTR"}},
-    {"getcwd", {"ENOENT"}},
-    {"getdents64", {"EIO"}},
-    {"newfstatat", {"EIO"}},
-    {"lseek", {"ESPIPE"}},
-    {"ioctl", {"ENOTTY"}},
-    {"openat", {"EMFILE", "ENFILE", "EINTR"}},
-    {"close", {"EINTR"}},
-    {"fcntl", {"EINTR"}},
-    {"utimensat", {"EROFS"}},
-    {"read", {"EIO"}},
-    {"sched_yield", {"EINVAL"}},
-    {"madvise", {"EINVAL"}},
-    {"prctl", {"EINVAL"}},
-};
+const char* const COUNTED_CALLS[] = {
+    "mmap:ENOMEM",         "munmap:ENOMEM",   "mprotect:ENOMEM",
+    "brk:ENOMEM",          "clone3:EAGAIN",   "rt_sigprocmask:EINVAL",
+    "rt_sigaction:EINVAL", "write:ENOSPC",    "write:EINTR",
+    "write:EAGAIN",        "write:EIO",       "ppoll:EINTR",
+    "ppoll:ENOMEM",        "poll:EINTR",      "clock_nanosleep:EINTR",
+    "getcwd:ENOENT",       "getdents64:EIO",  "newfstatat:EIO",
+    "lseek:ESPIPE",        "ioctl:ENOTTY",    "openat:EMFILE",
+    "openat:ENFILE",       "openat:EINTR",    "close:EINTR",
+    "fcntl:EINTR",         "utimensat:EROFS", "read:EIO",
+    "sched_yield:EINVAL",  "madvise:EINVAL",  "prctl:EINVAL"};
 
 struct counted_run {
     std::string sCall;
@@ -216,29 +191,18 @@ struct counted_run {
 
 std::vector<counted_run> counted_runs() {
     std::vector<counted_run> runs;
-    for (const auto& [pCall, errors] : COUNTED_CALLS)
-        for (const char* const pError : errors)
-            for (size_t uNumber = 1; uNumber <= (pCall == std::string("munmap") ? 2U : 5U);
-                 ++uNumber)
-                runs.push_back({pCall, pError, uNumber});
+    for (const std::string sEach : COUNTED_CALLS) {
+        const std::string sCall = sEach.substr(0, sEach.find(':'));
+        for (size_t uNumber = 1; uNumber <= (sCall == "munmap" ? 2U : 5U); ++uNumber)
+            runs.push_back({sCall, sEach.substr(sCall.size() + 1), uNumber});
+    }
     return runs;
-}
-
-std::string all_calls() {
-    std::string sCalls;
-    for (const counted_call& call : COUNTED_CALLS)
-        sCalls += std::string(sCalls.empty() ? "?" : ",?") + call.pCall;
-    return sCalls;
 }
 
 /// How often each call is made before `main`, whose first call opens /dev/null.
 std::map<std::string, size_t> calls_before_main() {
     const fault_sample sample;
-    std::vector<std::string> arguments = {
-        "-qq", "-o", log_of(sample), "-e", "trace=" + all_calls(), KELVO_PROGRAM};
-    for (std::string& sArgument : sample.arguments())
-        arguments.push_back(std::move(sArgument));
-    run_command(arguments, traced_setup());
+    run_command(traced(log_of(sample), {}, sample.arguments()), traced_setup());
     std::map<std::string, size_t> counts;
     for (const std::string& sLine : read_lines(log_of(sample))) {
         if (sLine.find("\"/dev/null\", O_RDONLY") != sLine.npos)
@@ -249,36 +213,26 @@ std::map<std::string, size_t> calls_before_main() {
     return counts;
 }
 
-/// A path of templates on which a relative directory comes first.
-std::vector<std::string> counted_arguments(const fault_sample& sample, bool bPreload) {
-    return {bPreload ? "-l" : "-k", "-t", ".:" + sample.directory(), sample.file(0),
-            sample.file(1)};
-}
-
 TEST_F(SystemCall, MayFailOnce) {
     if (SANITIZED)
         GTEST_SKIP() << "a sanitizer makes such calls itself and cannot do without";
     std::map<std::string, size_t> before = calls_before_main();
     const std::vector<counted_run> runs = counted_runs();
-    fault_sweep{}.sweep(
+    sweep_faults(
         runs.size(),
         [&](size_t uRun, const fault_sample& sample) {
             const auto& [sCall, sError, uNumber] = runs[uRun];
             const std::string sWhen = std::to_string(before[sCall] + uNumber);
-            std::vector<std::string> arguments = {"-qq",
-                                                  "-o",
-                                                  "/dev/null",
-                                                  "-e",
-                                                  "trace=?" + sCall,
-                                                  "-e",
-                                                  "inject=?" + sCall + ":error=" + sError +
-                                                      ":when=" + sWhen};
+            std::vector<std::string> options{"-e", "trace=?" + sCall, "-e",
+                                             "inject=?" + sCall + ":error=" + sError +
+                                                 ":when=" + sWhen};
             if (sCall != "munmap")
-                arguments.push_back("-f");
-            arguments.push_back(KELVO_PROGRAM);
-            for (std::string& sArgument : counted_arguments(sample, uRun % 2 == 0))
-                arguments.push_back(std::move(sArgument));
-            return fault_sweep::run{std::move(arguments), traced_setup()};
+                options.emplace_back("-f");
+            // A path of templates on which a relative directory comes first.
+            return fault_run{traced("/dev/null", options,
+                                    {uRun % 2 == 0 ? "-l" : "-k", "-t", ".:" + sample.dir.path(),
+                                     sample.files[0], sample.files[1]}),
+                             traced_setup()};
         },
         [&](size_t uRun, const fault_sample& sample, const command_result& result) {
             const auto& [sCall, sError, uNumber] = runs[uRun];
@@ -288,6 +242,7 @@ TEST_F(SystemCall, MayFailOnce) {
                 EXPECT_TRUE(sample.is_whole(0, result.sOut) && sample.is_whole(1, result.sOut));
                 EXPECT_EQ(result.status, 0);
             }
+            return true;
         });
 }
 
@@ -297,15 +252,16 @@ TEST_F(SystemCall, AFileMayShrinkWhileItIsOpened) {
     for (const char* const pOption : {"-r", "-f", "-B"}) {
         const fault_sample sample;
         command_setup setup = traced_setup();
-        setup.sDirectory = sample.directory(); // for a core file
-        live_command kelvo({"-f", "-qq", "-o", log_of(sample), "-P", sample.file(0), "-e",
-                            "trace=mmap", "-e", "inject=mmap:delay_exit=1500000:when=1",
-                            KELVO_PROGRAM, pOption, sample.file(0), sample.file(1)},
+        setup.sDirectory = sample.dir.path(); // for a core file
+        live_command kelvo(traced(log_of(sample),
+                                  {"-f", "-P", sample.files[0], "-e", "trace=mmap", "-e",
+                                   "inject=mmap:delay_exit=1500000:when=1"},
+                                  {pOption, sample.files[0], sample.files[1]}),
                            setup);
-        for (int i = 0; i < 60'000 && !is_locked(sample.file(0)); ++i)
+        for (int i = 0; i < 60'000 && !is_locked(sample.files[0]); ++i)
             usleep(1000);
         usleep(300'000); // it is mapped right after it is locked
-        ASSERT_EQ(truncate(sample.file(0).c_str(), 0), 0);
+        ASSERT_EQ(truncate(sample.files[0].c_str(), 0), 0);
         const command_result result = kelvo.wait();
         EXPECT_EQ(result.signo, SIGBUS) << pOption << '\n' << result.sErr;
         EXPECT_EQ(result.sErr, "");
