@@ -10,9 +10,12 @@
 #include <random>
 #include <unistd.h>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace {
+
+using testing::IsEmpty;
 
 class End : public testing::Test {
 protected:
@@ -24,28 +27,9 @@ protected:
                 pName, "handle_segv=0:handle_sigbus=0:handle_sigfpe=0:handle_sigill=0"));
     }
 
-    /// A writer that fills both files for as long as the test wants it.
-    live_command start_writer(const std::vector<std::string>& options = {}) {
-        std::vector<std::string> arguments{"-s", "262144"};
-        arguments.insert(arguments.end(), options.begin(), options.end());
-        arguments.insert(arguments.end(), {m_sFirst, m_sSecond});
-        return live_command(arguments, live_writer_setup());
-    }
-
     /// A run that follows both files from their first record on.
     live_command start_following() {
         return live_command({"-f", "-s", "+0r", "-o", "s", m_sFirst, m_sSecond}, m_setup);
-    }
-
-    /// A closed file whose text is much longer than a pipe and the run's queue.
-    std::string make_big_file(uint32_t uRecords = 200'000) {
-        trace_writer_options options;
-        options.uFileSize = 4096 + uRecords * 40;
-        trace_writer writer;
-        EXPECT_EQ(writer.create(m_sBig.c_str(), options), TRACE_WRITER_OK);
-        for (uint32_t i = 0; i < uRecords; ++i)
-            EXPECT_EQ(writer.append_uint32({"_TST", 1, i}, 1, i), TRACE_WRITER_OK);
-        return m_sBig;
     }
 
     useconds_t up_to(unsigned int uMicroseconds) {
@@ -55,14 +39,11 @@ protected:
     temp_dir m_dir;
     const std::string m_sFirst = m_dir.file("first.trc");
     const std::string m_sSecond = m_dir.file("second.trc");
-    const std::string m_sBig = m_dir.file("big.trc");
     command_setup m_setup;
     std::mt19937 m_random{static_cast<unsigned int>(getpid())};
 };
 
 // ------------------------------------------------------- terminating signals
-
-constexpr int TERMINATING[] = {SIGINT, SIGQUIT, SIGTSTP, SIGTTIN, SIGTTOU, SIGPIPE};
 
 /// Waits until the process has handlers of its own.
 void wait_until_armed(pid_t pid) {
@@ -80,10 +61,9 @@ void wait_until_armed(pid_t pid) {
 
 TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
     const uint64_t uTimes = setting("KELVO_TEST_LIVE_SIGNALS", 9);
-    live_command writer = start_writer();
-    writer.read_line_with("ready");
+    const live_writer writer(m_sFirst, m_sSecond);
     for (uint64_t i = 0; i < uTimes; ++i)
-        for (const int signo : TERMINATING) {
+        for (const int signo : {SIGINT, SIGQUIT, SIGTSTP, SIGTTIN, SIGTTOU, SIGPIPE}) {
             SCOPED_TRACE(strsignal(signo));
             live_command kelvo = start_following();
             record_stream stream(kelvo);
@@ -97,9 +77,7 @@ TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
                 usleep(up_to(60'000));
                 break;
             case 1: // while its reader keeps up
-                for (const uint64_t uEnough = up_to(10'000);
-                     stream.next() && stream.count() < uEnough;)
-                    ;
+                stream.read(1 + up_to(10'000));
                 break;
             case 2: // while nobody reads
                 stream.next();
@@ -108,14 +86,9 @@ TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
             }
             kelvo.send_signal(signo);
             usleep(up_to(5000));
-            stream.drain();
-            const command_result result = kelvo.wait();
-            EXPECT_EQ(result.status, 0) << "signal " << result.signo;
-            EXPECT_EQ(result.sErr, "");
+            stream.finish();
             ASSERT_FALSE(HasFailure());
         }
-    writer.send_signal(SIGTERM);
-    EXPECT_EQ(writer.wait().status, 0);
 }
 
 /// Also while a run that is short of memory shows its files and waits.
@@ -159,92 +132,67 @@ TEST_F(End, AFileTruncatedWhileItIsFollowedEndsTheRun) {
 
 /// Outside follow mode the reader meets it while the main thread writes.
 TEST_F(End, AFileTruncatedWhileItIsReadEndsTheRun) {
-    make_big_file();
-    live_command kelvo({"-r", m_sBig}, m_setup);
+    const std::vector<sample_record> records(200'000, sample_uint32(1, 1, 0)); // much text
+    ASSERT_EQ(write_sample_trace(m_sFirst, records, {.uFileSize = 8'000'000}), TRACE_WRITER_OK);
+    live_command kelvo({"-r", m_sFirst}, m_setup);
     kelvo.read_line_with("val=0x00000000");
     usleep(up_to(100'000));
-    ASSERT_EQ(truncate(m_sBig.c_str(), 0), 0);
+    ASSERT_EQ(truncate(m_sFirst.c_str(), 0), 0);
     const command_result result = kelvo.wait();
     EXPECT_EQ(result.signo, SIGBUS) << result.sErr;
 }
 
 // ------------------------------------------------------------ killed processes
 
-/// What a run that does not follow finds in the files: each one's numbers
-/// without a gap.
-void read_unbroken(record_stream& stream, live_command& kelvo) {
-    stream.drain();
-    const command_result result = kelvo.wait();
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.sErr, "");
-    EXPECT_TRUE(stream.missing().empty()) << testing::PrintToString(stream.missing());
-}
-
 TEST_F(End, AKilledWriterLeavesAFileThatCanBeRead) {
     const uint64_t uTimes = setting("KELVO_TEST_LIVE_KILLS", 8);
     for (uint64_t i = 0; i < uTimes && !HasFailure(); ++i) {
-        live_command writer = start_writer({"-r"});
-        writer.read_line_with("ready");
-        const bool bFollowed = i % 2 != 0;
-        std::optional<live_command> follower;
+        live_writer writer(m_sFirst, m_sSecond);
         uint64_t uLast = 0;
-        if (bFollowed) {
-            follower.emplace(
-                std::vector<std::string>{"-f", "-s", "+0r", "-o", "s", m_sFirst, m_sSecond},
-                m_setup);
-            record_stream stream(*follower);
-            for (const uint64_t uEnough = 1 + up_to(5000);
-                 stream.count() < uEnough && stream.next();)
-                ;
-            usleep(up_to(2000));
-            writer.send_signal(SIGKILL);
-            writer.wait();
-            usleep(150'000); // what is there is taken
-            follower->send_signal(SIGINT);
-            stream.drain();
-            EXPECT_EQ(follower->wait().status, 0);
-            EXPECT_TRUE(stream.missing().empty());
-            uLast = stream.last(0);
-        } else {
+        if (i % 2 == 0) {
             usleep(up_to(30'000));
-            writer.send_signal(SIGKILL);
-            writer.wait();
+            writer.kill();
+        } else {
+            live_command follower = start_following();
+            record_stream stream(follower);
+            stream.read(1 + up_to(5000));
+            usleep(up_to(2000));
+            writer.kill();
+            usleep(150'000); // what is there is taken
+            follower.send_signal(SIGINT);
+            stream.finish();
+            EXPECT_THAT(stream.missing, IsEmpty());
+            uLast = stream.last[0];
         }
         EXPECT_FALSE(is_locked(m_sFirst));
         live_command kelvo({"-o", "s", m_sFirst, m_sSecond}, m_setup);
         record_stream stream(kelvo);
-        read_unbroken(stream, kelvo);
-        EXPECT_GE(stream.last(0), uLast);
+        stream.finish();
+        EXPECT_THAT(stream.missing, IsEmpty());
+        EXPECT_GE(stream.last[0], uLast);
     }
 }
 
 TEST_F(End, AKilledReaderIsForgotten) {
     const uint64_t uTimes = setting("KELVO_TEST_LIVE_KILLS", 8);
-    live_command writer = start_writer({"-r"});
-    writer.read_line_with("ready");
+    const live_writer writer(m_sFirst, m_sSecond);
     uint64_t uLast = 0;
     for (uint64_t i = 0; i < uTimes && !HasFailure(); ++i) {
-        {
-            live_command kelvo = start_following();
-            usleep(up_to(120'000)); // also while it looks for its first record
-            kelvo.send_signal(SIGKILL);
-            kelvo.wait();
-        }
-        EXPECT_FALSE(is_locked(m_sFirst));
-        EXPECT_FALSE(is_locked(m_sSecond));
+        live_command killed = start_following();
+        usleep(up_to(120'000)); // also while it looks for its first record
+        killed.send_signal(SIGKILL);
+        killed.wait();
+        EXPECT_FALSE(is_locked(m_sFirst) || is_locked(m_sSecond));
         // Only a writer that goes on brings numbers beyond those that were there.
         live_command kelvo = start_following();
         record_stream stream(kelvo);
-        while (stream.last(0) <= uLast + 20'000 && stream.next()) {
+        while (stream.last[0] <= uLast + 20'000 && stream.next()) {
         }
-        uLast = stream.last(0);
+        uLast = stream.last[0];
         kelvo.send_signal(SIGINT);
-        stream.drain();
-        EXPECT_EQ(kelvo.wait().status, 0);
-        EXPECT_TRUE(stream.missing().empty()) << testing::PrintToString(stream.missing());
+        stream.finish();
+        EXPECT_THAT(stream.missing, IsEmpty());
     }
-    writer.send_signal(SIGTERM);
-    EXPECT_EQ(writer.wait().status, 0);
 }
 
 } // namespace

@@ -1,97 +1,110 @@
 #include "live_support.h"
 
-#include <algorithm>
+#include <chrono>
+#include <csignal>
 #include <cstdio>
-#include <ostream>
-#include <sstream>
+#include <fcntl.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <gtest/gtest.h>
 
 namespace {
 
-bool parse_record(std::string_view sLine, live_record* pRecord) {
-    if (sLine.starts_with('['))
-        sLine.remove_prefix(std::min(sLine.find(']') + 1, sLine.size()));
-    unsigned long long uNumber = 0;
-    const bool bParsed = sscanf(std::string(sLine).c_str(), " 0x%8x %u %llu ", &pRecord->uSeqNumber,
-                                &pRecord->uFile, &uNumber) == 3;
-    pRecord->uNumber = uNumber;
-    return bParsed;
-}
-
-bool is_summary(std::string_view sLine) {
-    return sLine.starts_with('\t') || sLine.find("Filename: ") != sLine.npos;
+std::string text_of(unsigned int uFile, uint64_t uNumber) {
+    return ' ' + std::to_string(uFile) + ' ' + std::to_string(uNumber) + ' ' +
+           std::string(uNumber % 47, 'x');
 }
 
 } // namespace
 
-command_setup live_writer_setup() {
-    command_setup setup;
-    setup.sProgram = KELVO_LIVE_WRITER;
-    setup.timeoutSeconds = 600;
-    return setup;
-}
-
-void PrintTo(const number_range& range, std::ostream* pOut) {
-    *pOut << range.uFirst << ".." << range.uLast;
-}
-
-missing_numbers dropped_by(const command_result& writer) {
-    EXPECT_EQ(writer.status, 0) << writer.sErr;
-    missing_numbers dropped;
-    std::istringstream lines(writer.sOut);
-    std::string sWord;
-    while (lines >> sWord) {
-        unsigned int uFile = 0;
-        number_range range{};
-        if (sWord == "dropped" && lines >> uFile >> range.uFirst >> range.uLast)
-            dropped[uFile].push_back(range);
+void wait_for_reader(trace_writer& writer) {
+    const auto& header = *reinterpret_cast<const trace_file_header*>(writer.mapping().data());
+    for (int i = 0; i < 60'000; ++i) {
+        writer.poll();
+        if (__atomic_load_n(&header.uSeqLock, __ATOMIC_ACQUIRE) != TRC_SEQ_NO_READER &&
+            __atomic_load_n(&header.uTailReq, __ATOMIC_ACQUIRE) == 0)
+            return;
+        usleep(1000);
     }
-    return dropped;
+    ADD_FAILURE() << "nobody reads the file";
 }
 
-std::optional<std::string_view> record_stream::next_line() {
-    size_t uEnd;
-    while ((uEnd = m_sText.find('\n', m_uAt)) == m_sText.npos) {
-        m_sText.erase(0, m_uAt);
-        m_uAt = 0;
-        const std::string sMore = m_command.read_text();
-        if (sMore.empty()) {
-            EXPECT_EQ(m_sText, "") << "the text ends within a record";
-            return {};
+live_files::live_files(const std::string& sFirst, const std::string& sSecond, uint32_t uFileSize) {
+    EXPECT_EQ(writers[0].create(sFirst.c_str(), {.uFileSize = uFileSize}), TRACE_WRITER_OK);
+    EXPECT_EQ(writers[1].create(sSecond.c_str(), {.uFileSize = uFileSize}), TRACE_WRITER_OK);
+}
+
+void live_files::write(uint64_t uCount, bool bRetry) {
+    for (uint64_t uNumber = 1; uNumber <= uCount; ++uNumber)
+        for (unsigned int uFile = 0; uFile < 2; ++uFile) {
+            const std::string sText = text_of(uFile, uNumber);
+            const std::chrono::nanoseconds now =
+                std::chrono::steady_clock::now().time_since_epoch();
+            const trace_origin origin{"_LIV", uFile, static_cast<uint64_t>(now.count())};
+            int status;
+            while ((status = writers[uFile].append_string(origin, sText)) == TRACE_WRITER_DROPPED &&
+                   (bRetry || uNumber == uCount))
+                usleep(100);
+            if (status == TRACE_WRITER_OK)
+                ++uWritten;
+            else
+                dropped.emplace(uFile, uNumber);
         }
-        m_sText += sMore;
+}
+
+live_writer::live_writer(const std::string& sFirst, const std::string& sSecond) {
+    int ready[2];
+    EXPECT_EQ(pipe2(ready, O_CLOEXEC), 0);
+    m_pid = fork();
+    if (m_pid == 0) {
+        prctl(PR_SET_PDEATHSIG, SIGKILL);
+        live_files files(sFirst, sSecond, 262144);
+        (void)!::write(ready[1], "", 1);
+        files.write(UINT64_MAX, true);
     }
-    const std::string_view sLine = std::string_view(m_sText).substr(m_uAt, uEnd - m_uAt);
-    m_uAt = uEnd + 1;
-    return sLine;
+    close(ready[1]);
+    char cReady;
+    EXPECT_EQ(::read(ready[0], &cReady, 1), 1);
+    close(ready[0]);
 }
 
-void record_stream::check_order(const live_record& record) {
-    uint64_t& uLast = m_last[record.uFile];
-    if (uLast != 0 && record.uNumber > uLast + 1)
-        m_missing[record.uFile].push_back({uLast + 1, record.uNumber - 1});
-    if (record.uNumber <= uLast)
-        ADD_FAILURE() << "file " << record.uFile << ": " << record.uNumber << " behind " << uLast;
-    // Only the last record of a killed writer may be left without its number.
-    if (m_lacksNumber.contains(record.uFile))
-        ADD_FAILURE() << "file " << record.uFile << ": " << uLast
-                      << " was taken before it had its sequence number";
-    if (record.uSeqNumber % 2 != 0)
-        m_lacksNumber.insert(record.uFile);
-    uLast = record.uNumber;
+void live_writer::kill() {
+    if (m_pid > 0) {
+        ::kill(m_pid, SIGKILL);
+        waitpid(m_pid, nullptr, 0);
+    }
+    m_pid = -1;
 }
 
-std::optional<live_record> record_stream::next() {
-    while (const auto line = next_line()) {
-        live_record record;
-        if (parse_record(*line, &record)) {
-            ++m_uCount;
-            check_order(record);
-            return record;
+bool record_stream::next() {
+    for (std::string sLine; !(sLine = m_command.read_line()).empty();) {
+        unsigned int uSeqNumber, uFile;
+        unsigned long long uNumber;
+        if (sscanf(sLine.c_str(), "[%*u] 0x%x %u %llu", &uSeqNumber, &uFile, &uNumber) != 3) {
+            if (uCount != 0 || (!sLine.starts_with('\t') && sLine.find("Filename: ") == sLine.npos))
+                ADD_FAILURE() << "no record: " << sLine;
+            continue;
         }
-        if (m_uCount != 0 || !is_summary(*line))
-            ADD_FAILURE() << "no record: " << *line;
+        uint64_t& uLast = last.at(uFile);
+        EXPECT_TRUE(sLine.ends_with(text_of(uFile, uNumber))) << sLine;
+        EXPECT_GT(uNumber, uLast) << sLine;
+        // Only the last record of a killed writer may be left without its number.
+        EXPECT_FALSE(m_lacksNumber.at(uFile)) << uLast << " was taken before it had its number";
+        for (uint64_t uMissing = uLast + 1; uLast != 0 && uMissing < uNumber; ++uMissing)
+            missing.emplace(uFile, uMissing);
+        m_lacksNumber[uFile] = uSeqNumber % 2 != 0;
+        uLast = uNumber;
+        ++uCount;
+        return true;
     }
-    return {};
+    return false;
+}
+
+void record_stream::finish() {
+    read(UINT64_MAX);
+    const command_result result = m_command.wait();
+    EXPECT_EQ(result.status, 0) << "signal " << result.signo;
+    EXPECT_EQ(result.sErr, "");
 }

@@ -1,82 +1,78 @@
-// What the tests of following runs share: the process that writes, and the
-// records that a command prints of it.
+// What the tests of following runs share: who writes two files as fast as it
+// can, and the records that a command prints of them.
 #pragma once
 
 #include "run_command.h"
+#include "trace_writer.h"
 
+#include <array>
 #include <cstdint>
-#include <map>
-#include <optional>
 #include <set>
 #include <string>
-#include <string_view>
-#include <vector>
+#include <utility>
 
-/// live_writer with these arguments, which see live_writer.cpp.
-command_setup live_writer_setup();
+/// Waits until a reader of the file has found its first record; answers it.
+void wait_for_reader(trace_writer& writer);
 
-/// Numbers from uFirst to uLast.
-struct number_range {
-    uint64_t uFirst;
-    uint64_t uLast;
-    friend bool operator==(const number_range&, const number_range&) = default;
-};
-void PrintTo(const number_range& range, std::ostream* pOut);
+/// Numbers of records, each with the index of its file.
+using record_numbers = std::set<std::pair<unsigned int, uint64_t>>;
 
-/// Per file the numbers that are not there, in order.
-using missing_numbers = std::map<unsigned int, std::vector<number_range>>;
+/// Two files that are filled with records 1, 2, 3... by turns, every one a string
+/// of the file's index, the number and some letters.
+class live_files {
+public:
+    live_files(const std::string& sFirst, const std::string& sSecond, uint32_t uFileSize);
 
-/// The "dropped" lines of a live_writer that has ended.
-missing_numbers dropped_by(const command_result& writer);
+    /// Appends `uCount` records to each file. Where a reader leaves no room, a
+    /// record is dropped, or with `bRetry` tried again; so is the last one always.
+    void write(uint64_t uCount, bool bRetry);
 
-/// A record of a live_writer as it was printed with -o s.
-struct live_record {
-    unsigned int uFile = 0;
-    uint64_t uNumber = 0;
-    uint32_t uSeqNumber = 0;
+    std::array<trace_writer, 2> writers;
+    uint64_t uWritten = 0;
+    record_numbers dropped;
 };
 
-/// The records that a command prints, one after the other. Fails the test when
-/// anything but whole records follows the file summaries.
+/// A process that goes on writing such files until it is killed.
+class live_writer {
+public:
+    live_writer(const std::string& sFirst, const std::string& sSecond);
+    ~live_writer() {
+        kill();
+    }
+    live_writer(const live_writer&) = delete;
+    live_writer& operator=(const live_writer&) = delete;
+
+    void kill();
+
+private:
+    pid_t m_pid = -1;
+};
+
+/// The records that a command prints of such files with -o s, one after the
+/// other. Fails the test when anything but whole records follows the summaries.
 class record_stream {
 public:
     explicit record_stream(live_command& command) : m_command(command) {}
 
-    /// The next record; none at the end of the output.
-    std::optional<live_record> next();
+    /// Takes the next record; false at the end of the output.
+    bool next();
 
-    /// Everything up to the end of the output.
-    void drain() {
-        while (next()) {
+    /// Takes records up to number `uEnd` of all.
+    void read(uint64_t uEnd) {
+        while (uCount < uEnd && next()) {
         }
     }
 
-    /// Records so far.
-    uint64_t count() const {
-        return m_uCount;
-    }
+    /// Takes all that is left, and expects the command to end well and in silence.
+    void finish();
 
-    /// The last number of a file; 0: none yet.
-    uint64_t last(unsigned int uFile) const {
-        const auto found = m_last.find(uFile);
-        return found == m_last.end() ? 0 : found->second;
-    }
-
-    /// The gaps between the records of each file: the first record of a file
-    /// begins the count.
-    const missing_numbers& missing() const {
-        return m_missing;
-    }
+    uint64_t uCount = 0;            ///< records so far
+    std::array<uint64_t, 2> last{}; ///< the last number of each file; 0: none yet
+    /// What is left out between the records of each file: the first record of a
+    /// file begins the count.
+    record_numbers missing;
 
 private:
-    std::optional<std::string_view> next_line();
-    void check_order(const live_record& record);
-
     live_command& m_command;
-    std::string m_sText;
-    size_t m_uAt = 0; ///< what lies before is done with
-    uint64_t m_uCount = 0;
-    std::map<unsigned int, uint64_t> m_last;
-    std::set<unsigned int> m_lacksNumber; ///< files whose last record has no sequence number
-    missing_numbers m_missing;
+    std::array<bool, 2> m_lacksNumber{}; ///< the last record has no sequence number
 };

@@ -17,126 +17,72 @@ using testing::HasSubstr;
 
 constexpr uint64_t SECOND = 1'000'000'000;
 constexpr uint64_t NOON = 1'614'859'200 * SECOND; // 4 March 2021 12:00:00 UTC
-
-using numbers = std::vector<uint32_t>;
-
-/// Values of the raw records in an output.
-numbers printed(const std::string& sOut) {
-    numbers values;
-    for (size_t uAt = 0; (uAt = sOut.find("val=0x", uAt)) != sOut.npos; uAt += 6)
-        values.push_back(static_cast<uint32_t>(std::stoul(sOut.substr(uAt + 6, 8), nullptr, 16)));
-    return values;
-}
-
-/// uFirst to uLast; nothing when uFirst is 0.
-numbers from_to(uint32_t uFirst, uint32_t uLast) {
-    numbers values(uFirst == 0 ? 0 : uLast - uFirst + 1);
-    std::iota(values.begin(), values.end(), uFirst);
-    return values;
-}
-
-struct start_case {
-    std::string sStart;
-    uint32_t uFirst; ///< number of the first printed record; 0: none is printed
-};
+constexpr uint32_t RECORDS = 20;
 
 class Start : public testing::Test {
 protected:
-    /// Record i of the file has the value i, from 1, and the i-th of these times.
-    std::string make(const std::string& sName, const std::vector<uint64_t>& times,
-                     const trace_writer_options& options = {}) {
+    /// Record i has the value i, from 1, and was written i seconds after noon.
+    std::string make(const std::string& sName, const trace_writer_options& options = {}) {
         std::vector<sample_record> records;
-        for (const uint64_t uTime : times)
-            records.push_back(sample_uint32(uTime, 1, static_cast<uint32_t>(records.size()) + 1));
+        for (uint32_t i = 1; i <= RECORDS; ++i)
+            records.push_back(sample_uint32(NOON + i * SECOND, 1, i));
         EXPECT_EQ(write_sample_trace(m_dir.file(sName), records, options), TRACE_WRITER_OK);
         return m_dir.file(sName);
     }
 
-    /// `uCount` records, the first one second after `uBegin`, a second apart.
-    static std::vector<uint64_t> seconds(uint64_t uBegin, uint64_t uCount) {
-        std::vector<uint64_t> times;
-        for (uint64_t i = 1; i <= uCount; ++i)
-            times.push_back(uBegin + i * SECOND);
-        return times;
+    /// Expects that records `uFirst` to the last are printed; none when it is 0.
+    void expect_start(const std::vector<std::string>& arguments, uint32_t uFirst) {
+        SCOPED_TRACE(testing::PrintToString(arguments));
+        const command_result result = run_command(arguments, m_setup);
+        EXPECT_EQ(result.status, 0);
+        EXPECT_EQ(result.sErr, "");
+        std::vector<uint32_t> values;
+        for (size_t uAt = 0; (uAt = result.sOut.find("val=0x", uAt)) != std::string::npos; ++uAt)
+            values.push_back(static_cast<uint32_t>(strtoul(&result.sOut[uAt + 6], nullptr, 16)));
+        std::vector<uint32_t> expected(uFirst == 0 ? 0 : RECORDS + 1 - uFirst);
+        std::iota(expected.begin(), expected.end(), uFirst);
+        EXPECT_EQ(values, expected);
     }
 
-    static command_result run(const std::string& sStart, const std::string& sPath,
-                              const command_setup& setup = {}) {
-        return run_command({"-r", "-s", sStart, sPath}, setup);
-    }
-
-    static void expect_starts(const std::string& sPath, uint32_t uLast,
-                              const std::vector<start_case>& cases,
-                              const command_setup& setup = {}) {
-        for (const auto& [sStart, uFirst] : cases) {
-            const command_result result = run(sStart, sPath, setup);
-            EXPECT_EQ(result.status, 0) << '"' << sStart << '"';
-            EXPECT_EQ(result.sErr, "") << '"' << sStart << '"';
-            EXPECT_EQ(printed(result.sOut), from_to(uFirst, uLast)) << '"' << sStart << '"';
-        }
-    }
-
-    static void expect_refused(const std::string& sPath, const std::vector<std::string>& starts,
-                               const std::string& sMessage, const command_setup& setup = {}) {
-        for (const std::string& sStart : starts) {
-            const command_result result = run(sStart, sPath, setup);
-            EXPECT_EQ(result.status, 1) << '"' << sStart << '"';
-            EXPECT_EQ(result.sErr, KELVO_PROGRAM + sMessage + "\n\n") << '"' << sStart << '"';
-            EXPECT_THAT(result.sOut, HasSubstr("\nkelvo [-fhbrl]")) << '"' << sStart << '"';
-            EXPECT_THAT(result.sOut,
-                        EndsWith("records from the beginning (+) or end (-) of the file.\n"));
-        }
+    void expect_refused(const std::string& sStart, const std::string& sPath,
+                        const std::string& sMessage) {
+        const command_result result = run_command({"-s", sStart, sPath}, m_setup);
+        EXPECT_EQ(result.status, 1);
+        EXPECT_EQ(result.sErr, KELVO_PROGRAM + sMessage + "\n\n");
+        EXPECT_THAT(result.sOut, HasSubstr("\nkelvo [-fhbrl]"));
+        EXPECT_THAT(result.sOut, EndsWith("from the beginning (+) or end (-) of the file.\n"));
     }
 
     temp_dir m_dir;
+    command_setup m_setup;
 };
 
 constexpr char BAD_DELTA[] = ": 2625-153 Delta start time or record number is invalid.";
 constexpr char BAD_TIME[] = ": 2625-154 Start time is invalid.";
 
-TEST_F(Start, ByRecordOrByTime) {
-    const std::string sTwenty = make("twenty", seconds(NOON, 20));
-    expect_starts(sTwenty, 20,
-                  {{" \t+3r", 3},
-                   {"+21r", 0},
-                   {"-5r", 15},
-                   {"+4s", 6},
-                   {"-4s", 17},
-                   {"03/04/21 12:00:07", 8},
-                   {"03/04/21 12:00:06.999999999", 7}});
-    expect_starts(make("ages", {951'782'400 * SECOND, 2'119'000'000 * SECOND}), 2, {{"", 2}});
-    expect_refused(sTwenty, {"+5"}, BAD_DELTA);
-    expect_refused(sTwenty, {"03/04/21"}, BAD_TIME);
-}
-
-TEST_F(Start, ReadsTimesInTheZoneOfTheFirstFile) {
-    trace_writer_options west, east;
+TEST_F(Start, ByRecordOrByTimeInTheZoneOfTheFile) {
+    m_setup.environment = {"TZ=XXX-2"};
+    trace_writer_options west;
     west.tz_offset = 300;
-    east.tz_offset = -330;
-    const std::string sWest = make("west", seconds(NOON, 20), west);
-    const std::string sEast = make("east", seconds(NOON, 20), east);
-    const std::string sLocal = make("local", seconds(NOON, 20));
+    const std::string sLocal = make("local"), sWest = make("west", west);
     const struct {
-        std::vector<std::string> options;
-        std::vector<std::string> files;
-        const char* pStart;
+        std::string sStart;
+        uint32_t uFirst;
     } cases[] = {
-        {{}, {sWest}, "03/04/21 07:00:18"},        {{}, {sEast}, "03/04/21 17:30:18"},
-        {{}, {sLocal}, "03/04/21 14:00:18"},       {{"-k"}, {sWest}, "03/04/21 14:00:18"},
-        {{}, {sWest, sEast}, "03/04/21 07:00:18"}, {{}, {sLocal, sEast}, "03/04/21 14:00:18"},
+        {" \t+3r", 3},
+        {"+21r", 0},
+        {"-5r", 15},
+        {"+4s", 6},
+        {"-4s", 17},
+        {"03/04/21 14:00:07", 8},
+        {"03/04/21 14:00:06.999999999", 7},
     };
-    command_setup setup;
-    setup.environment = {"TZ=XXX-2"};
-    for (const auto& [options, files, pStart] : cases) {
-        std::vector<std::string> arguments{"-r", "-s", pStart};
-        arguments.insert(arguments.end(), options.begin(), options.end());
-        arguments.insert(arguments.end(), files.begin(), files.end());
-        const command_result result = run_command(arguments, setup);
-        EXPECT_EQ(result.sErr, "");
-        EXPECT_EQ(printed(result.sOut),
-                  files.size() == 1 ? numbers({19, 20}) : numbers({19, 19, 20, 20}))
-            << testing::PrintToString(arguments);
-    }
+    for (const auto& [sStart, uFirst] : cases)
+        expect_start({"-r", "-s", sStart, sLocal}, uFirst);
+    expect_start({"-r", "-s", "03/04/21 07:00:18", sWest}, 19);
+    expect_start({"-r", "-k", "-s", "03/04/21 14:00:18", sWest}, 19);
+    expect_refused("+5", sLocal, BAD_DELTA);
+    expect_refused("03/04/21", sLocal, BAD_TIME);
 }
 
 /// Makes a locale that has the times of `sSource`, one of the system's sources,
@@ -158,48 +104,42 @@ bool make_locale(const std::string& sSource, const std::string& sPath) {
 TEST_F(Start, ReadsAndWritesTimesInTheUsersLocale) {
     const struct {
         const char* pSource;
-        const char* pStart;
-        const char* pFraction; ///< a start between records 7 and 8
+        const char* pStart; ///< between records 7 and 8
         const char* pRefused;
         const char* pPrinted; ///< date and time of record 8
     } cases[] = {
-        {"de_DE", "04.03.2021 14:00:07", "04.03.2021 14:00:07.25", "2021-03-04 14:00:07",
-         "04.03.2021 14:00:08.000000000"},
-        {"en_US", "03/04/2021 02:00:07 PM", "03/04/2021 02:00:07 PM.25", "04.03.2021 14:00:07",
+        {"de_DE", "04.03.2021 14:00:07.25", "2021-03-04 14:00:07", "04.03.2021 14:00:08.000000000"},
+        {"en_US", "03/04/2021 02:00:07 PM.25", "04.03.2021 14:00:07",
          "03/04/2021 02:00:08 PM.000000000"},
     };
-    const std::string sTwenty = make("twenty", seconds(NOON, 20));
-    for (const auto& [pSource, pStart, pFraction, pRefused, pPrinted] : cases) {
+    const std::string sPath = make("a.trc");
+    for (const auto& [pSource, pStart, pRefused, pPrinted] : cases) {
         SCOPED_TRACE(pSource);
         const std::string sName = std::string(pSource) + ".UTF-8";
         if (!make_locale(pSource, m_dir.file(sName)))
             GTEST_SKIP() << "no localedef or no source of " << pSource;
-        command_setup setup;
-        setup.environment = {"TZ=XXX-2", "LOCPATH=" + m_dir.path(), "LC_ALL=" + sName};
-        expect_starts(sTwenty, 20, {{pStart, 8}, {pFraction, 8}}, setup);
-        expect_refused(sTwenty, {pRefused}, BAD_TIME, setup);
-        EXPECT_THAT(run_command({"-r", "-odt", sTwenty}, setup).sOut, HasSubstr(pPrinted));
+        m_setup.environment = {"TZ=XXX-2", "LOCPATH=" + m_dir.path(), "LC_ALL=" + sName};
+        expect_start({"-r", "-s", pStart, sPath}, 8);
+        expect_refused(pRefused, sPath, BAD_TIME);
+        EXPECT_THAT(run_command({"-r", "-odt", sPath}, m_setup).sOut, HasSubstr(pPrinted));
     }
 }
 
 TEST_F(Start, ProgressGoesFromNoneToAllFiles) {
-    std::vector<std::string> arguments{"-i"};
-    for (const char* pName : {"a", "b", "c"})
-        arguments.push_back(make(pName, seconds(NOON, 20)));
-    arguments.push_back(m_dir.file("no trace file"));
-    ASSERT_TRUE(write_file(arguments.back(), raw_bytes(uint32_t{0})));
-    const command_result result = run_command(arguments);
+    const std::string sBad = m_dir.file("no trace file");
+    ASSERT_TRUE(write_file(sBad, raw_bytes(uint32_t{0})));
+    const command_result result = run_command({"-i", make("a"), make("b"), make("c"), sBad});
     EXPECT_EQ(result.status, 1);
-    std::string sExpected = "\r  0%|" + std::string(50, ' ') + "|       0/4 files processed... ";
-    sExpected += KELVO_PROGRAM + std::string(": 2625-105 File \"") + arguments.back() +
-                 "\" is too small to be a trace file.\n\n";
-    const int marks[] = {12, 25, 37, 50};
-    for (int i = 1; i <= 4; ++i) {
-        const size_t uMarks = static_cast<size_t>(marks[i - 1]);
+    std::string sExpected;
+    for (int i = 0; i <= 4; ++i) {
+        const std::string sMarks(static_cast<size_t>(i * 50 / 4), '#');
         char line[128];
-        snprintf(line, sizeof line, "\r%3d%%|%s%s|%8d/4 files processed... ", 25 * i,
-                 std::string(uMarks, '#').c_str(), std::string(50 - uMarks, ' ').c_str(), i);
+        snprintf(line, sizeof line, "\r%3d%%|%-50s|%8d/4 files processed... ", 25 * i,
+                 sMarks.c_str(), i);
         sExpected += line;
+        if (i == 0)
+            sExpected += KELVO_PROGRAM ": 2625-105 File \"" + sBad +
+                         "\" is too small to be a trace file.\n\n";
     }
     EXPECT_EQ(result.sErr, sExpected + "\n");
 }
