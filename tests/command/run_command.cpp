@@ -7,7 +7,6 @@
 #include <cstdlib>
 #include <fcntl.h>
 #include <poll.h>
-#include <string_view>
 #include <sys/prctl.h>
 #include <sys/resource.h>
 #include <sys/wait.h>
@@ -18,68 +17,11 @@
 
 namespace {
 
-/// Variables of the tester's environment that would change the result.
-constexpr std::string_view DROPPED_PREFIXES[] = {"LC_",
-                                                 "LANG",
-                                                 "TZ=",
-                                                 "NLSPATH=",
-                                                 "KV_TR_TEMPLATE_PATH=",
-                                                 "KELVO_USE_LOWMEM=",
-                                                 "POSIXLY_CORRECT="};
+constexpr int64_t TIMEOUT_MS = 120'000; // of each wait
 
 int64_t now_ms() {
     using namespace std::chrono;
     return duration_cast<milliseconds>(steady_clock::now().time_since_epoch()).count();
-}
-
-bool is_dropped(std::string_view sVariable) {
-    for (const std::string_view sPrefix : DROPPED_PREFIXES)
-        if (sVariable.starts_with(sPrefix))
-            return true;
-    return false;
-}
-
-/// A later variable of the same name wins.
-std::vector<std::string> make_environment(const command_setup& setup) {
-    std::vector<std::string> result;
-    const auto set = [&result](std::string_view sVariable) {
-        const std::string_view sName = sVariable.substr(0, sVariable.find('=') + 1);
-        std::erase_if(result, [&](const std::string& sOld) { return sOld.starts_with(sName); });
-        result.emplace_back(sVariable);
-    };
-    for (char** ppVariable = environ; *ppVariable != nullptr; ++ppVariable)
-        if (!is_dropped(*ppVariable))
-            result.emplace_back(*ppVariable);
-    set("LC_ALL=C");
-    set("TZ=UTC0");
-    set(sanitizer_option("TSAN_OPTIONS", ""));
-    for (const std::string& sVariable : setup.environment)
-        set(sVariable);
-    return result;
-}
-
-std::vector<char*> pointers(std::vector<std::string>& texts) {
-    std::vector<char*> result;
-    result.reserve(texts.size() + 1);
-    for (std::string& sText : texts)
-        result.push_back(sText.data());
-    result.push_back(nullptr);
-    return result;
-}
-
-struct pipe_ends {
-    int read = -1;
-    int write = -1;
-};
-
-pipe_ends make_pipe() {
-    int fds[2];
-    if (pipe2(fds, O_CLOEXEC) != 0) {
-        ADD_FAILURE() << "pipe2: " << errno;
-        return {};
-    }
-    fcntl(fds[0], F_SETFL, O_NONBLOCK);
-    return {fds[0], fds[1]};
 }
 
 void close_fd(int& fd) {
@@ -88,14 +30,21 @@ void close_fd(int& fd) {
     fd = -1;
 }
 
-/// In the child: system calls only.
-[[noreturn]] void become_program(const command_setup& setup, char** argv, char** envp, int outFd,
+/// In the child.
+[[noreturn]] void become_program(const command_setup& setup, const char* const* argv, int outFd,
                                  int errFd) {
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     sigset_t none;
     sigemptyset(&none);
     sigprocmask(SIG_SETMASK, &none, nullptr);
     signal(SIGPIPE, SIG_DFL);
+    for (const char* pName :
+         {"NLSPATH", "KV_TR_TEMPLATE_PATH", "KELVO_USE_LOWMEM", "POSIXLY_CORRECT"})
+        unsetenv(pName);
+    std::vector<std::string> variables{"LC_ALL=C", "TZ=UTC0", sanitizer_option("TSAN_OPTIONS", "")};
+    variables.insert(variables.end(), setup.environment.begin(), setup.environment.end());
+    for (std::string& sVariable : variables)
+        putenv(sVariable.data());
     const int inFd = open("/dev/null", O_RDONLY);
     if (!setup.sStdout.empty())
         outFd = open(setup.sStdout.c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
@@ -105,35 +54,32 @@ void close_fd(int& fd) {
     if (setup.bStdoutClosed)
         close(STDOUT_FILENO);
     if (setup.sDirectory.empty() || chdir(setup.sDirectory.c_str()) == 0)
-        execve(argv[0], argv, envp);
+        execv(argv[0], const_cast<char* const*>(argv));
     _exit(127);
 }
 
 } // namespace
 
 live_command::live_command(const std::vector<std::string>& arguments, const command_setup& setup)
-    : m_sName(setup.sProgram), m_timeoutSeconds(setup.timeoutSeconds) {
-    std::vector<std::string> words{setup.sProgram};
+    : m_sName(setup.sProgram) {
+    std::vector<const char*> argv{setup.sProgram.c_str()};
     for (const std::string& sArgument : arguments) {
-        words.push_back(sArgument);
+        argv.push_back(sArgument.c_str());
         m_sName += ' ' + sArgument;
     }
-    std::vector<std::string> environment = make_environment(setup);
-    const std::vector<char*> argv = pointers(words);
-    const std::vector<char*> envp = pointers(environment);
-    pipe_ends out = make_pipe();
-    pipe_ends err = make_pipe();
-
-    m_pid = fork();
+    argv.push_back(nullptr);
+    int out[2] = {-1, -1};
+    int err[2] = {-1, -1};
+    if (pipe2(out, O_CLOEXEC) == 0 && pipe2(err, O_CLOEXEC) == 0)
+        m_pid = fork();
     if (m_pid == 0)
-        become_program(setup, const_cast<char**>(argv.data()), const_cast<char**>(envp.data()),
-                       out.write, err.write);
+        become_program(setup, argv.data(), out[1], err[1]);
     if (m_pid < 0)
-        ADD_FAILURE() << "fork: " << errno;
-    close_fd(out.write);
-    close_fd(err.write);
-    m_out.fd = out.read;
-    m_err.fd = err.read;
+        ADD_FAILURE() << "pipe2 or fork: " << errno;
+    close_fd(out[1]);
+    close_fd(err[1]);
+    m_out.fd = out[0];
+    m_err.fd = err[0];
 }
 
 live_command::~live_command() {
@@ -173,14 +119,14 @@ bool live_command::receive(int64_t iDeadline) {
         const ssize_t length = read(fds[i].fd, buffer, sizeof buffer);
         if (length > 0)
             streams[i]->sText.append(buffer, static_cast<size_t>(length));
-        else if (length == 0 || errno != EAGAIN)
+        else
             close_fd(streams[i]->fd);
     }
     return true;
 }
 
 std::string live_command::read_line() {
-    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    const int64_t iDeadline = now_ms() + TIMEOUT_MS;
     size_t uEnd;
     while ((uEnd = m_out.sText.find('\n')) == std::string::npos && m_out.fd >= 0)
         receive(iDeadline);
@@ -190,7 +136,7 @@ std::string live_command::read_line() {
 }
 
 std::string live_command::read_text() {
-    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    const int64_t iDeadline = now_ms() + TIMEOUT_MS;
     while (m_out.sText.empty() && m_out.fd >= 0)
         receive(iDeadline);
     return std::exchange(m_out.sText, {});
@@ -208,7 +154,7 @@ std::string live_command::read_line_with(const std::string& sText) {
 }
 
 void live_command::wait_for_error(const std::string& sText) {
-    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
+    const int64_t iDeadline = now_ms() + TIMEOUT_MS;
     while (m_err.sText.find(sText) == std::string::npos) {
         if (m_err.fd < 0) {
             ADD_FAILURE() << "standard error has no \"" << sText << "\": " << m_sName << '\n'
@@ -231,16 +177,15 @@ void live_command::close_output() {
     close_fd(m_out.fd);
 }
 
-/// Collects the end of the program, which has closed its streams.
-void live_command::reap(int64_t iDeadline) {
-    int state = 0;
+command_result live_command::wait() {
+    const int64_t iDeadline = now_ms() + TIMEOUT_MS;
+    while (receive(iDeadline)) {
+    }
+    int state = -1;
     rusage usage{};
-    while (wait4(m_pid, &state, WNOHANG, &usage) == 0) {
-        if (now_ms() > iDeadline) {
+    while (m_pid > 0 && wait4(m_pid, &state, WNOHANG, &usage) == 0) {
+        if (now_ms() > iDeadline)
             give_up("did not end");
-            wait4(m_pid, &state, 0, &usage);
-            break;
-        }
         usleep(1000);
     }
     m_pid = -1;
@@ -249,14 +194,6 @@ void live_command::reap(int64_t iDeadline) {
         m_result.status = WEXITSTATUS(state);
     if (WIFSIGNALED(state))
         m_result.signo = WTERMSIG(state);
-}
-
-command_result live_command::wait() {
-    const int64_t iDeadline = now_ms() + m_timeoutSeconds * INT64_C(1000);
-    while (receive(iDeadline)) {
-    }
-    if (m_pid > 0)
-        reap(iDeadline);
     m_result.sOut = std::move(m_out.sText);
     m_result.sErr = std::move(m_err.sText);
     return m_result;

