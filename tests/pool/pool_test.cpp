@@ -38,16 +38,14 @@ int __wrap_pthread_create(pthread_t* pId, const pthread_attr_t* pAttributes, voi
 namespace {
 
 /// Runs `body` in a fresh process and fails with it.
-#define IN_OWN_PROCESS(body)                                                                       \
-    do {                                                                                           \
-        GTEST_FLAG_SET(death_test_style, "threadsafe");                                            \
-        EXPECT_EXIT(                                                                               \
-            {                                                                                      \
-                body();                                                                            \
-                exit(testing::Test::HasFailure() ? 1 : 0);                                         \
-            },                                                                                     \
-            testing::ExitedWithCode(0), "");                                                       \
-    } while (0)
+void in_own_process(void (*body)()) {
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    const auto run = [body] {
+        body();
+        exit(testing::Test::HasFailure() ? 1 : 0);
+    };
+    EXPECT_EXIT(run(), testing::ExitedWithCode(0), "");
+}
 
 /// A task that notes its arrival and then stays until the gate is opened.
 struct gate_t {
@@ -87,8 +85,10 @@ void* pass_gate(void* pTask) {
 std::array<std::atomic<pthread_t>, 64> ids;
 std::array<int, 64> tasks;
 
-int add_task(size_t uTask) {
-    return poolAddNewTask(&ids[uTask], &tasks[uTask]);
+/// Adds the tasks from number `uBegin` on, up to but not including `uEnd`.
+void add_tasks(size_t uBegin, size_t uEnd) {
+    for (size_t uTask = uBegin; uTask < uEnd; ++uTask)
+        ASSERT_EQ(poolAddNewTask(&ids[uTask], &tasks[uTask]), 0);
 }
 
 void start_pool() {
@@ -97,108 +97,93 @@ void start_pool() {
     ASSERT_EQ(startNewThreadPool(), 0);
 }
 
-void grows_when_fewer_than_three_are_free() {
-    CaptureStderr();
-    memory_is_restricted = 1;
-    start_pool();
-    for (size_t uTask = 0; uTask < 14; ++uTask) {
-        ASSERT_EQ(add_task(uTask), 0);
-        gate.wait_for_entered(uTask + 1);
-    }
-    EXPECT_EQ(GetCapturedStderr(),
-              "[POOL]Total: 000000    Free: 000000 |  Adding Threads\n"
-              "[POOL] Total: 000016    Free: 000016 |  Aifter adding Threads\n");
-    CaptureStderr();
-    ASSERT_EQ(add_task(14), 0);
-    gate.wait_for_entered(15);
-    EXPECT_THAT(
-        GetCapturedStderr(),
-        testing::EndsWith("[POOL]Total: 000016    Free: 000002 |  Adding Threads\n"
-                          "[POOL] Total: 000020    Free: 000006 |  Aifter adding Threads\n"));
-    EXPECT_TRUE(gate.bAsynchronousBlocked);
-    EXPECT_NE(ids[14].load(), 0U);
-
-    sigset_t mask;
-    pthread_sigmask(SIG_BLOCK, nullptr, &mask);
-    EXPECT_EQ(sigismember(&mask, SIGINT), 0) << "the creator's own mask is open again";
-
-    gate.open();
-    EXPECT_TRUE(endThrdPool());
-    EXPECT_EQ(ids[14].load(), 0U);
-    EXPECT_EQ(totalFreeThrdsInPool.load(), 0U);
-}
-
-TEST(Pool, GrowsWhenFewerThanThreeAreFree) {
-    IN_OWN_PROCESS(grows_when_fewer_than_three_are_free);
-}
-
-/// With one thread in all, tasks cannot overtake one another.
-void runs_tasks_in_order() {
-    CaptureStderr();
-    iThreadsAllowed = 1;
-    start_pool();
-    EXPECT_EQ(totalThrdsInPool.load(), 1U);
-    iThreadsAllowed = 0;
-    EXPECT_EQ(add_task(0), -1) << "refused although a thread is free";
-    EXPECT_THAT(GetCapturedStderr(),
-                HasSubstr("WARNING: Insufficient memory (size=0) to process: pthread_create\n"));
-
-    totalFreeThrdsInPool += 1000; // so that nothing is added from here on
-    gate.open();
-    std::vector<void*> expected;
-    for (size_t uTask = 0; uTask < tasks.size(); ++uTask) {
-        ASSERT_EQ(add_task(uTask), 0);
-        expected.push_back(&tasks[uTask]);
-    }
-    gate.wait_for_entered(tasks.size());
-    EXPECT_EQ(gate.entered, expected);
-    EXPECT_TRUE(endThrdPool());
-}
-
-TEST(Pool, RunsTasksInOrder) {
-    IN_OWN_PROCESS(runs_tasks_in_order);
-}
-
-void closing_drops_what_has_not_begun() {
-    iThreadsAllowed = 3;
-    start_pool();
-    totalFreeThrdsInPool += 1000; // nothing is added: three tasks run, the others wait
-    for (size_t uTask = 0; uTask < 10; ++uTask)
-        ASSERT_EQ(add_task(uTask), 0);
-    gate.wait_for_entered(3);
-
-    EXPECT_FALSE(endThrdPool()) << "three tasks still run";
-    EXPECT_EQ(add_task(10), -1);
-    totalFreeThrdsInPool = 0;
-    iThreadsAllowed = 100;
-    EXPECT_EQ(add_task(10), -1);
-    EXPECT_EQ(totalThrdsInPool.load(), 3U) << "a closed pool does not grow";
-
+void open_gate_and_close_pool() {
     gate.open();
     while (!endThrdPool()) {
     }
-    EXPECT_EQ(gate.entered.size(), 3U);
+}
+
+TEST(Pool, GrowsWhenFewerThanThreeAreFree) {
+    in_own_process([] {
+        CaptureStderr();
+        memory_is_restricted = 1;
+        start_pool();
+        add_tasks(0, 14);
+        EXPECT_EQ(GetCapturedStderr(),
+                  "[POOL]Total: 000000    Free: 000000 |  Adding Threads\n"
+                  "[POOL] Total: 000016    Free: 000016 |  Aifter adding Threads\n");
+        gate.wait_for_entered(14);
+        CaptureStderr();
+        add_tasks(14, 15);
+        EXPECT_EQ(GetCapturedStderr(),
+                  "[POOL]Total: 000016    Free: 000002 |  Adding Threads\n"
+                  "[POOL] Total: 000020    Free: 000006 |  Aifter adding Threads\n");
+        gate.wait_for_entered(15);
+        EXPECT_TRUE(gate.bAsynchronousBlocked);
+        EXPECT_NE(ids[14].load(), 0U);
+
+        sigset_t mask;
+        pthread_sigmask(SIG_BLOCK, nullptr, &mask);
+        EXPECT_EQ(sigismember(&mask, SIGINT), 0) << "the creator's own mask is open again";
+
+        open_gate_and_close_pool();
+        EXPECT_EQ(ids[14].load(), 0U);
+        EXPECT_EQ(totalFreeThrdsInPool.load(), 0U);
+    });
+}
+
+/// With one thread in all, tasks cannot overtake one another.
+TEST(Pool, RunsTasksInOrder) {
+    in_own_process([] {
+        CaptureStderr();
+        iThreadsAllowed = 1;
+        start_pool();
+        EXPECT_EQ(totalThrdsInPool.load(), 1U);
+        EXPECT_EQ(poolAddNewTask(&ids[0], &tasks[0]), -1) << "refused although a thread is free";
+        EXPECT_THAT(
+            GetCapturedStderr(),
+            HasSubstr("WARNING: Insufficient memory (size=0) to process: pthread_create\n"));
+
+        totalFreeThrdsInPool += 1000; // so that nothing is added from here on
+        gate.open();
+        add_tasks(0, tasks.size());
+        gate.wait_for_entered(tasks.size());
+        std::vector<void*> expected;
+        for (int& task : tasks)
+            expected.push_back(&task);
+        EXPECT_EQ(gate.entered, expected);
+        EXPECT_TRUE(endThrdPool());
+    });
 }
 
 TEST(Pool, ClosingDropsWhatHasNotBegun) {
-    IN_OWN_PROCESS(closing_drops_what_has_not_begun);
+    in_own_process([] {
+        iThreadsAllowed = 3;
+        start_pool();
+        totalFreeThrdsInPool += 1000; // nothing is added: three tasks run, the others wait
+        add_tasks(0, 10);
+        gate.wait_for_entered(3);
+
+        EXPECT_FALSE(endThrdPool()) << "three tasks still run";
+        EXPECT_EQ(poolAddNewTask(&ids[10], &tasks[10]), -1);
+        totalFreeThrdsInPool = 0;
+        iThreadsAllowed = 100;
+        EXPECT_EQ(poolAddNewTask(&ids[10], &tasks[10]), -1);
+        EXPECT_EQ(totalThrdsInPool.load(), 3U) << "a closed pool does not grow";
+        open_gate_and_close_pool();
+        EXPECT_EQ(gate.entered.size(), 3U);
+    });
 }
 
 /// None of the tasks ends before all have begun: each needs a thread of its own,
 /// however few threads have woken up when the next one comes.
-void every_task_gets_a_thread() {
-    iThreadsAllowed = 1000;
-    start_pool();
-    for (size_t uTask = 0; uTask < tasks.size(); ++uTask)
-        ASSERT_EQ(add_task(uTask), 0);
-    gate.wait_for_entered(tasks.size());
-    gate.open();
-    while (!endThrdPool()) {
-    }
-}
-
 TEST(Pool, EveryTaskGetsAThreadOfItsOwn) {
-    IN_OWN_PROCESS(every_task_gets_a_thread);
+    in_own_process([] {
+        start_pool();
+        add_tasks(0, tasks.size());
+        gate.wait_for_entered(tasks.size());
+        open_gate_and_close_pool();
+    });
 }
 
 } // namespace

@@ -8,13 +8,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <chrono>
 #include <csignal>
-#include <cstring>
 #include <filesystem>
 #include <set>
 #include <sstream>
-#include <thread>
+#include <unistd.h>
 
 namespace {
 
@@ -23,15 +21,7 @@ using testing::Not;
 
 using arguments = std::vector<std::string>;
 
-command_setup sample_setup() {
-    command_setup setup;
-    setup.sProgram = KELVO_SAMPLE_PROGRAM;
-    return setup;
-}
-
-bool is_printed(const ring_element& record) {
-    return record.header.function < TRC_FUNC_TIME_CALIBRATION;
-}
+const command_setup SAMPLE{.sProgram = KELVO_SAMPLE_PROGRAM};
 
 class Sample : public testing::Test {
 protected:
@@ -39,17 +29,17 @@ protected:
     std::string make(const std::string& sName, arguments options) {
         const std::string sDirectory = m_dir.file(sName);
         options.insert(options.end(), {"-d", sDirectory});
-        const command_result result = run_command(options, sample_setup());
+        const command_result result = run_command(options, SAMPLE);
         EXPECT_EQ(result.status, 0);
         EXPECT_EQ(result.sErr, "");
         EXPECT_THAT(result.sOut, HasSubstr("kelvo -t " + sDirectory));
         return sDirectory;
     }
 
-    static arguments files_of(const std::string& sDirectory, const char* pExtension = ".trc") {
+    static arguments files_of(const std::string& sDirectory) {
         arguments files;
         for (const auto& entry : std::filesystem::directory_iterator(sDirectory))
-            if (entry.path().extension() == pExtension)
+            if (entry.path().extension() == ".trc")
                 files.push_back(entry.path());
         std::sort(files.begin(), files.end());
         return files;
@@ -59,22 +49,6 @@ protected:
         const ring_listing ring = list_ring(read_file(sFile));
         EXPECT_EQ(ring.problem, "") << sFile;
         return ring.records();
-    }
-
-    /// Returns when the records of a live file fill so many bytes. By then the
-    /// program has slept at least once; the thread sanitizer's runtime loses a
-    /// signal that comes while it prepares a thread's first sleep.
-    static void wait_until_written(const std::string& sFile, uint32_t uBytes) {
-        for (int i = 0; i < 60'000; ++i) {
-            trace_file_header header{};
-            const std::vector<std::byte> bytes = read_file(sFile);
-            ASSERT_GE(bytes.size(), sizeof header);
-            memcpy(&header, bytes.data(), sizeof header);
-            if (header.uOldestRecordOffset >= header.uOffset + uBytes)
-                return;
-            std::this_thread::sleep_for(std::chrono::milliseconds(1));
-        }
-        ADD_FAILURE() << "nothing is written into " << sFile;
     }
 
     /// Everything that kelvo prints behind the file headers.
@@ -90,6 +64,19 @@ protected:
         return result.sOut.substr(result.sOut.find('\n', uAt) + 1);
     }
 
+    /// Expects a line with a file's index for each record that is printed at all.
+    static void expect_all_printed(const std::string& sDirectory, const std::string& sText) {
+        long iPrinted = 0;
+        for (const std::string& sFile : files_of(sDirectory))
+            iPrinted += std::ranges::count_if(records_of(sFile), [](const ring_element& record) {
+                return record.header.function < TRC_FUNC_TIME_CALIBRATION;
+            });
+        std::istringstream lines(sText);
+        for (std::string sLine; std::getline(lines, sLine);)
+            iPrinted -= sLine.starts_with("[0");
+        EXPECT_EQ(iPrinted, 0) << "records are missing";
+    }
+
     temp_dir m_dir;
 };
 
@@ -97,40 +84,22 @@ TEST_F(Sample, StoryHoldsEveryKindAndReadsWell) {
     for (const char* const pAddr : {"64", "32"}) {
         const std::string sDirectory = make(pAddr, {"--addr", pAddr});
         std::set<unsigned> kinds;
-        long iPrinted = 0;
         for (const std::string& sFile : files_of(sDirectory)) {
             const std::vector<ring_element> records = records_of(sFile);
             for (const ring_element& record : records)
                 kinds.insert(record.header.function);
-            iPrinted += std::count_if(records.begin(), records.end(), is_printed);
             const bool bWrapped = records.front().header.seqNumber != 2;
             EXPECT_EQ(bWrapped, sFile.ends_with("/storage.trc")) << sFile;
         }
         EXPECT_THAT(kinds, testing::ElementsAre(1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14, 15,
                                                 16, 17, 19, 0xFFFE));
-
         const std::string sText = print(sDirectory);
+        expect_all_printed(sDirectory, sText);
         EXPECT_THAT(sText, HasSubstr("error 28 in grow_volume"));
         EXPECT_THAT(sText, HasSubstr("volume data1 is full, "));
         EXPECT_THAT(sText, HasSubstr("status 201, created"));
         for (const char* const pUnformatted : {"id=0x", "%d", "%s", "%ld", "Data Block 1"})
             EXPECT_THAT(sText, Not(HasSubstr(pUnformatted)));
-        std::istringstream lines(sText);
-        std::string sTime;
-        int iWide = 0;
-        long iRecords = 0;
-        for (std::string sLine; std::getline(lines, sLine);) {
-            EXPECT_LE(sLine.size(), 120U);
-            iWide += sLine.size() > 80 ? 1 : 0;
-            if (!sLine.starts_with('['))
-                continue;
-            ++iRecords;
-            EXPECT_LT(sTime, sLine.substr(5, 18));
-            sTime = sLine.substr(5, 18);
-        }
-        EXPECT_LE(iWide, 3) << "a hex dump and a resource handle do not fit 80 columns";
-        EXPECT_EQ(iRecords, iPrinted);
-        EXPECT_TRUE(iRecords >= 60 && iRecords <= 100) << iRecords;
     }
 }
 
@@ -161,25 +130,15 @@ TEST_F(Sample, AllRecordsFitUnlessTheFileIsMadeSmaller) {
             arguments options{"-p", pProfile, "-r", std::to_string(RECORDS)};
             options.insert(options.end(), more.begin(), more.end());
             const std::string sDirectory = make(sName, options);
-            const arguments files = files_of(sDirectory);
-            EXPECT_EQ(files.size(), 3U);
-            long iPrinted = 0;
-            for (const std::string& sFile : files) {
+            EXPECT_EQ(files_of(sDirectory).size(), 3U);
+            for (const std::string& sFile : files_of(sDirectory)) {
                 const std::vector<ring_element> records = records_of(sFile);
                 ASSERT_FALSE(records.empty());
                 EXPECT_EQ(records.back().header.seqNumber, 2 * RECORDS);
-                if (more.empty() || more[0] != "-s")
-                    EXPECT_EQ(records.size(), RECORDS);
-                else
-                    EXPECT_LT(records.size(), RECORDS);
-                iPrinted += std::count_if(records.begin(), records.end(), is_printed);
+                EXPECT_EQ(records.size() == RECORDS, !sName.ends_with("-s"));
             }
             // Brief, so that no dump can look like a record.
-            const std::string sText = "\n" + print(sDirectory, {"-b", "-o", ""});
-            long iRecords = 0;
-            for (size_t uAt = 0; (uAt = sText.find("\n[0", uAt)) != std::string::npos; ++uAt)
-                ++iRecords;
-            EXPECT_EQ(iRecords, iPrinted);
+            expect_all_printed(sDirectory, print(sDirectory, {"-b", "-o", ""}));
         }
 }
 
@@ -201,11 +160,9 @@ TEST_F(Sample, NumbersAndTimesAreAsAsked) {
             EXPECT_EQ(threads.size(), 2U);
         }
     }
-    const arguments options{"-p", "numbers", "-r", "20"};
-    arguments distinct = options;
-    distinct.emplace_back("--distinct-bases");
-    const std::string sSame = make("same", options);
-    const std::string sDistinct = make("distinct", distinct);
+    const std::string sSame = make("same", {"-p", "numbers", "-r", "20"});
+    const std::string sDistinct =
+        make("distinct", {"-p", "numbers", "-r", "20", "--distinct-bases"});
     EXPECT_EQ(print(sSame), print(sDistinct)) << "the bases must not move the times";
     EXPECT_NE(read_file(files_of(sSame)[0]), read_file(files_of(sDistinct)[0]));
 }
@@ -215,16 +172,21 @@ TEST_F(Sample, LiveRunsEndByCountOrSignal) {
     const command_result counted =
         run_command({"--live", "--numbered", "--rate", "0", "--count", "700", "-n", "2", "-p",
                      "strings", "-d", sDirectory},
-                    sample_setup());
+                    SAMPLE);
     EXPECT_EQ(counted.status, 0);
     EXPECT_THAT(counted.sOut, HasSubstr("strings-1.trc: 700 records written, 0 dropped\n"));
     for (const std::string& sFile : files_of(sDirectory))
         EXPECT_EQ(records_of(sFile).size(), 700U);
 
     for (const int signo : {SIGINT, SIGTERM}) {
-        live_command live({"--live", "--rate", "1000", "-d", m_dir.file("story")}, sample_setup());
+        live_command live({"--live", "--rate", "1000", "-d", m_dir.file("story")}, SAMPLE);
         EXPECT_THAT(live.read_line(), HasSubstr("kelvo -f -t "));
-        wait_until_written(m_dir.file("story/gateway.trc"), 2048);
+        // By then it has slept at least once; the thread sanitizer's runtime loses a
+        // signal that comes while it prepares a thread's first sleep.
+        const std::string sLive = m_dir.file("story/gateway.trc");
+        for (uint32_t uAt = 0, iTries = 0; uAt < 2048 && iTries < 60'000; ++iTries, usleep(1000))
+            uAt =
+                load<uint32_t>(read_file(sLive), offsetof(trace_file_header, uOldestRecordOffset));
         live.send_signal(signo);
         const command_result result = live.wait();
         EXPECT_EQ(result.status, 0);
@@ -235,7 +197,7 @@ TEST_F(Sample, LiveRunsEndByCountOrSignal) {
 }
 
 TEST_F(Sample, HelpAndWrongOptions) {
-    const command_result help = run_command({"--help"}, sample_setup());
+    const command_result help = run_command({"--help"}, SAMPLE);
     EXPECT_EQ(help.status, 0);
     EXPECT_THAT(help.sOut, HasSubstr("--distinct-bases"));
 
@@ -244,8 +206,8 @@ TEST_F(Sample, HelpAndWrongOptions) {
         const char* pSays;
     } cases[] = {
         {{"--bogus"}, "bogus"},
+        {{"-d", "/dev/null/x"}, "/dev/null/x"},
         {{"stray"}, "stray"},
-        {{"-n", "0"}, "--files"},
         {{"-n", "3x"}, "3x"},
         {{"-r", "-1"}, "--records"},
         {{"-r", "99999999999999999999"}, "--records"},
@@ -264,16 +226,13 @@ TEST_F(Sample, HelpAndWrongOptions) {
     };
     for (const auto& [options, pSays] : cases) {
         SCOPED_TRACE(testing::PrintToString(options));
-        arguments all = options;
-        all.insert(all.end(), {"-d", m_dir.file("wrong")});
-        const command_result result = run_command(all, sample_setup());
+        arguments all{"-d", m_dir.file("wrong")};
+        all.insert(all.end(), options.begin(), options.end());
+        const command_result result = run_command(all, SAMPLE);
         EXPECT_EQ(result.status, 1);
         EXPECT_EQ(result.sOut, "");
         EXPECT_THAT(result.sErr, HasSubstr(pSays));
     }
-    const command_result noDirectory = run_command({"-d", "/dev/null/x"}, sample_setup());
-    EXPECT_EQ(noDirectory.status, 1);
-    EXPECT_THAT(noDirectory.sErr, HasSubstr("/dev/null/x"));
 }
 
 } // namespace
