@@ -1,20 +1,9 @@
 #include "raw_trace.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <cstring>
-#include <memory>
-
-namespace {
-
-struct close_file {
-    void operator()(FILE* pFile) const {
-        fclose(pFile);
-    }
-};
-using file_handle = std::unique_ptr<FILE, close_file>;
-
-} // namespace
+#include <fstream>
+#include <iterator>
 
 void add_bytes(std::vector<std::byte>* pBytes, trace_bytes more) {
     const size_t uEnd = pBytes->size();
@@ -94,19 +83,14 @@ bool raw_trace::write(const std::string& path) const {
 }
 
 bool write_file(const std::string& path, trace_bytes bytes) {
-    file_handle pFile(fopen(path.c_str(), "wbe"));
-    if (pFile == nullptr)
-        return false;
-    const bool bWritten = bytes.empty() || fwrite(bytes.data(), bytes.size(), 1, pFile.get()) == 1;
-    return fclose(pFile.release()) == 0 && bWritten;
+    std::ofstream file(path, std::ios::binary);
+    file.write(reinterpret_cast<const char*>(bytes.data()), std::ssize(bytes));
+    file.close();
+    return file.good();
 }
 
 std::vector<std::byte> read_file(const std::string& path) {
-    std::vector<std::byte> bytes;
-    const file_handle pFile(fopen(path.c_str(), "rbe"));
-    std::byte buffer[65536];
-    size_t uRead = 0;
-    while (pFile != nullptr && (uRead = fread(buffer, 1, sizeof(buffer), pFile.get())) > 0)
-        add_bytes(&bytes, trace_bytes(buffer).first(uRead));
-    return bytes;
+    std::ifstream file(path, std::ios::binary);
+    const std::string sText{std::istreambuf_iterator<char>(file), {}};
+    return raw_bytes(sText);
 }

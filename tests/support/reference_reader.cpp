@@ -43,17 +43,13 @@ std::vector<ring_element> ring_listing::records() const {
 }
 
 ring_listing list_ring(trace_bytes file) {
-    ring_listing ring;
     const auto header = load<trace_file_header>(file, 0);
     const size_t uOldest = header.uOldestRecordOffset;
-    if (header.uActualFileSize != file.size()) {
-        ring.problem = "uActualFileSize " + std::to_string(header.uActualFileSize);
-        return ring;
-    }
-    if (uOldest < header.uOffset || !lies_inside(file, uOldest, sizeof(trace_record_header))) {
-        ring.problem = "uOldestRecordOffset " + std::to_string(uOldest);
-        return ring;
-    }
+    if (header.uActualFileSize != file.size())
+        return {{}, "uActualFileSize " + std::to_string(header.uActualFileSize)};
+    if (uOldest < header.uOffset || !lies_inside(file, uOldest, sizeof(trace_record_header)))
+        return {{}, "uOldestRecordOffset " + std::to_string(uOldest)};
+    ring_listing ring;
     size_t uAt = uOldest;
     size_t uWalked = 0;
     do {

@@ -1,13 +1,11 @@
 #include "sample_trace.h"
 
-sample_record sample_uint32(uint64_t timeStamp, uint32_t traceId, uint32_t value,
-                            std::string_view compId, uint32_t threadId) {
-    return {TRC_FUNC_UINT32, compId, threadId, timeStamp, raw_bytes(traceId, value)};
+sample_record sample_uint32(uint64_t timeStamp, uint32_t traceId, uint32_t value) {
+    return {TRC_FUNC_UINT32, "_TST", 1, timeStamp, raw_bytes(traceId, value)};
 }
 
-sample_record sample_string(uint64_t timeStamp, std::string_view text, std::string_view compId,
-                            uint32_t threadId) {
-    return {TRC_FUNC_STRING, compId, threadId, timeStamp, raw_bytes(text, '\0')};
+sample_record sample_string(uint64_t timeStamp, std::string_view text) {
+    return {TRC_FUNC_STRING, "_TST", 1, timeStamp, raw_bytes(text, '\0')};
 }
 
 trace_writer_status append_all(trace_writer& writer, const std::vector<sample_record>& records) {

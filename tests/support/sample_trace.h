@@ -17,12 +17,10 @@ struct sample_record {
 };
 
 /// A record of kind TRC_FUNC_UINT32 with a value, the commonest case.
-sample_record sample_uint32(uint64_t timeStamp, uint32_t traceId, uint32_t value,
-                            std::string_view compId = "_TST", uint32_t threadId = 1);
+sample_record sample_uint32(uint64_t timeStamp, uint32_t traceId, uint32_t value);
 
 /// A record of kind TRC_FUNC_STRING.
-sample_record sample_string(uint64_t timeStamp, std::string_view text,
-                            std::string_view compId = "_TST", uint32_t threadId = 1);
+sample_record sample_string(uint64_t timeStamp, std::string_view text);
 
 /// Appends all records. Returns the first status that is not TRACE_WRITER_OK.
 trace_writer_status append_all(trace_writer& writer, const std::vector<sample_record>& records);
