@@ -4,8 +4,9 @@
 # Usage: completions_test.sh ROOT
 
 set -euo pipefail
+# shellcheck source=tests/docs/failures.sh
+. "$(dirname -- "$0")/failures.sh"
 completions=$1/completions
-failures=0
 
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
@@ -27,11 +28,8 @@ offers() {
     COMPREPLY=()
     _kelvo || true
     offered=$(printf '%s\n' "${COMPREPLY[@]}" | sort)
-    if [ "$offered" != "$expected" ]; then
-        printf 'FAILED: "%s" offers "%s", not "%s"\n' "$line" "${offered//$'\n'/ }" \
-            "${expected//$'\n'/ }" >&2
-        failures=$((failures + 1))
-    fi
+    [ "$offered" = "$expected" ] ||
+        fail "\"$line\" offers \"${offered//$'\n'/ }\", not \"${expected//$'\n'/ }\""
 }
 
 offers 'kelvo -' -f -h -b -r -l -i -k -z -B -o -t -s
@@ -54,11 +52,7 @@ offers 'kelvo -t dirs/alpha:dirs/b' dirs/alpha:dirs/beta
 for shell in 'zsh _kelvo' 'fish kelvo.fish'; do
     read -r shell file <<<"$shell"
     command -v "$shell" >/dev/null || continue
-    if ! "$shell" -n "$completions/$file"; then
-        echo "FAILED: $shell does not understand $file" >&2
-        failures=$((failures + 1))
-    fi
+    "$shell" -n "$completions/$file" || fail "$shell does not understand $file"
 done
 
-[ $failures -eq 0 ] || exit 1
-echo "The completions offer what they should."
+finish "The completions offer what they should."

@@ -5,16 +5,12 @@
 # shellcheck disable=SC2016  # the backticks are Markdown
 
 set -euo pipefail
+# shellcheck source=tests/docs/failures.sh
+. "$(dirname -- "$0")/failures.sh"
 export LC_ALL=C
 cd -- "$1"
 
 pages=(README.md HACKING.md CONTRIBUTING.md SECURITY.md docs/threads.md)
-failures=0
-
-fail() {
-    printf 'FAILED: %s\n' "$*" >&2
-    failures=$((failures + 1))
-}
 
 # What stands between backticks in a page, one piece a line. Indented code counts
 # as such a piece, blocks between fences do not.
@@ -114,5 +110,4 @@ while read -r piece; do
 done < <(pieces SECURITY.md)
 
 if [ $paths -lt 50 ] || [ $promises -lt 5 ]; then fail "the pages were not understood"; fi
-[ $failures -eq 0 ] || exit 1
-echo "All is there: $paths paths, $promises promises and their tests."
+finish "All is there: $paths paths, $promises promises and their tests."

@@ -4,17 +4,13 @@
 # Usage: pages_test.sh ROOT
 
 set -euo pipefail
+# shellcheck source=tests/docs/failures.sh
+. "$(dirname -- "$0")/failures.sh"
 export LC_ALL=C
 cd -- "$1"
 
 options=trace/cmds/kelvo_main/options.cpp
 page=docs/kelvo.1
-failures=0
-
-fail() {
-    printf 'FAILED: %s\n' "$*" >&2
-    failures=$((failures + 1))
-}
 
 # same WHAT A_NAME A B_NAME B: both are lists, one item a line, and neither may be
 # empty: then it was not found where it is looked for.
@@ -145,5 +141,4 @@ while read -r name section; do
     [ -e "docs/$name.$section" ] || fail "reference to $name($section), which is no page"
 done < <(sed -nE 's/^\.Xr (kelvo[a-z_-]*) ([1-9]).*/\1 \2/p' docs/*.[1-9] | sort -u)
 
-[ $failures -eq 0 ] || exit 1
-echo "The pages and completions agree with the sources."
+finish "The pages and completions agree with the sources."

@@ -8,9 +8,10 @@
 # Usage: readme_test.sh ROOT BUILD
 
 set -euo pipefail
+# shellcheck source=tests/docs/failures.sh
+. "$(dirname -- "$0")/failures.sh"
 root=$1 build=$2
 readme=$root/README.md
-failures=0
 commands=0
 live_pid=''
 follow_pid=''
@@ -28,11 +29,6 @@ leave() {
 }
 trap leave EXIT
 cd "$work"
-
-fail() {
-    printf 'FAILED: %s\n' "$*" >&2
-    failures=$((failures + 1))
-}
 
 # Whether the text of file $1 is what $2 shows.
 shows() {
@@ -226,5 +222,4 @@ done
 [ -z "$live_pid" ] || fail "nobody follows the live sample"
 if [ $commands -lt 15 ] || [ ${#codes[@]} -lt 10 ]; then fail "README.md was not understood"; fi
 
-[ $failures -eq 0 ] || exit 1
-echo "README.md shows what happens: $commands commands, ${#codes[@]} pieces of code."
+finish "README.md shows what happens: $commands commands, ${#codes[@]} pieces of code."
