@@ -94,12 +94,14 @@ TEST_F(End, TerminatingSignalsEndAFollowingRunAtAnyMoment) {
 /// Also while a run that is short of memory shows its files and waits.
 TEST_F(End, ATerminatingSignalEndsThePauseOfARunShortOfMemory) {
     ASSERT_EQ(write_sample_trace(m_sFirst, {sample_string(8, "later")}), TRACE_WRITER_OK);
-    ASSERT_EQ(write_sample_trace(m_sSecond, {sample_string(7, "earlier")}), TRACE_WRITER_OK);
+    ASSERT_EQ(
+        write_sample_trace(m_sSecond, {sample_string(1007, "earlier")}, {.timeInfo = {0, 1000}}),
+        TRACE_WRITER_OK);
     m_setup.environment.push_back("KELVO_USE_LOWMEM=1");
     live_command kelvo({m_sFirst, m_sSecond}, m_setup);
     kelvo.wait_for_error(
         std::string(32, '=') + "SORTED TRACE FILE LIST" + std::string(35, '=') +
-        "\nFileIndex: 001\tTimeStamp: 00000000000000000007\tFileName: " + m_sSecond +
+        "\nFileIndex: 001\tTimeStamp: 00000000000000001007\tFileName: " + m_sSecond +
         "\nFileIndex: 000\tTimeStamp: 00000000000000000008\tFileName: " + m_sFirst + "\n");
     kelvo.send_signal(SIGINT);
     EXPECT_EQ(kelvo.wait().status, 0);
