@@ -14,25 +14,6 @@
 
 namespace {
 
-// Puts `fd` in the place of standard output, fresh, for the life of the object.
-class stdout_on {
-public:
-    explicit stdout_on(int fd) : savedFd(dup(STDOUT_FILENO)) {
-        dup2(fd, STDOUT_FILENO);
-        stdout_reset();
-    }
-    ~stdout_on() {
-        dup2(savedFd, STDOUT_FILENO);
-        close(savedFd);
-        stdout_reset();
-    }
-    stdout_on(const stdout_on&) = delete;
-    stdout_on& operator=(const stdout_on&) = delete;
-
-private:
-    int savedFd;
-};
-
 std::string read_all(int fd) {
     std::string all;
     char buffer[1000];
@@ -48,24 +29,27 @@ TEST(StdoutStream, LosesNothingOnASlowPipeThatDoesNotBlock) {
     std::string expected;
     std::string received;
     std::thread reader([&] { received = read_all(fds[0]); });
-    {
-        const stdout_on output(fds[1]);
-        close(fds[1]);
-        for (int i = 0; i < 40000; i++) {
-            const std::string line = std::to_string(i) + "\n";
-            expected += line + ".  ";
-            stdout_write(line);
-            stdout_put('.');
-            stdout_fill(' ', 2);
-        }
-        const std::string big(300000, 'b');
-        expected += big;
-        stdout_write(big);
-        EXPECT_FALSE(stdout_is_empty());
-        stdout_flush();
-        EXPECT_TRUE(stdout_is_empty());
-        EXPECT_EQ(stdout_error(), 0);
+    const int savedFd = dup(STDOUT_FILENO);
+    dup2(fds[1], STDOUT_FILENO);
+    close(fds[1]);
+    stdout_reset();
+    for (int i = 0; i < 40000; i++) {
+        const std::string line = std::to_string(i) + "\n";
+        const std::string blanks(static_cast<size_t>(i % 50), ' ');
+        expected += line + "." + blanks;
+        stdout_write(line);
+        stdout_put('.');
+        stdout_fill(' ', blanks.size());
     }
+    const std::string big(300000, 'b');
+    expected += big;
+    stdout_write(big);
+    EXPECT_FALSE(stdout_is_empty());
+    stdout_flush();
+    EXPECT_TRUE(stdout_is_empty());
+    EXPECT_EQ(stdout_error(), 0);
+    dup2(savedFd, STDOUT_FILENO); // closes the pipe for the reader
+    close(savedFd);
     reader.join();
     close(fds[0]);
     EXPECT_TRUE(received == expected);
