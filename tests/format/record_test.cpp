@@ -3,8 +3,9 @@
 
 #include "record.h"
 
+#include "data_block.h"
 #include "frame.h"
-#include "record_kinds.h"
+#include "raw_trace.h"
 #include "stdout_stream.h"
 #include "store.h"
 #include "temp_dir.h"
@@ -25,16 +26,23 @@ using testing::internal::CaptureStdout;
 using testing::internal::GetCapturedStderr;
 using testing::internal::GetCapturedStdout;
 
-static bool bCallocFails;
+static bool bAllocationFails;
 
-// The linker puts this in the place of calloc, from which templates come.
+// The linker puts these in the place of malloc and calloc, from which states of
+// threads and templates come.
+extern "C" void* __real_malloc(size_t size);
 extern "C" void* __real_calloc(size_t count, size_t size);
-extern "C" void* __wrap_calloc(size_t count, size_t size);
+extern "C" void* __wrap_malloc(size_t size) {
+    return bAllocationFails ? nullptr : __real_malloc(size);
+}
 extern "C" void* __wrap_calloc(size_t count, size_t size) {
-    return bCallocFails ? nullptr : __real_calloc(count, size);
+    return bAllocationFails ? nullptr : __real_calloc(count, size);
 }
 
 namespace {
+
+using byte_vector = std::vector<std::byte>;
+using namespace std::string_view_literals;
 
 struct block_deleter {
     void operator()(trace_queue_element* pElement) const {
@@ -43,56 +51,24 @@ struct block_deleter {
 };
 using element_ptr = std::unique_ptr<trace_queue_element, block_deleter>;
 
-/// The bytes of a record body, put together field by field.
-struct body {
-    std::string bytes;
-
-    template <class T> body& put(T value) {
-        bytes.append(reinterpret_cast<const char*>(&value), sizeof(value));
-        return *this;
-    }
-    body& u32(uint32_t uValue) {
-        return put(uValue);
-    }
-    body& u64(uint64_t uValue) {
-        return put(uValue);
-    }
-    body& text(std::string_view value) {
-        bytes.append(value);
-        return *this;
-    }
-    body& string(std::string_view value) {
-        return text(value).put('\0');
-    }
-    body& block(std::string_view data) {
-        put(static_cast<int32_t>(data.size())).text(data);
-        bytes.resize((bytes.size() + 3) / 4 * 4);
-        return *this;
-    }
-};
-
 /// An element in a heap block of its exact size, so that the address sanitizer
 /// sees every step beyond it.
-element_ptr make_element(trace_file* pFile, uint16_t uFunction, const std::string& bodyBytes,
-                         const char* pCompId = "_ZPB") {
-    const auto uLength = static_cast<uint32_t>(sizeof(trace_record_header) + bodyBytes.size());
-    const size_t uBlock = uLength + QUEUE_ELEMENT_OVERHEAD;
+element_ptr make_element(trace_file* pFile, uint16_t uFunction, const byte_vector& body,
+                         std::string_view compId = "_ZPB") {
+    const byte_vector bytes = raw_record_bytes({.function = uFunction,
+                                                .seqNumber = 2,
+                                                .compId = compId,
+                                                .threadId = 7,
+                                                .timeStamp = 5,
+                                                .body = body});
+    const size_t uBlock = bytes.size() + QUEUE_ELEMENT_OVERHEAD;
     auto* pElement = static_cast<trace_queue_element*>(std::malloc(uBlock));
     // What follows the record must not be taken for its end.
     std::memset(pElement, 'X', uBlock);
     pElement->pFile = pFile;
     pElement->length = static_cast<uint32_t>(uBlock);
-    pElement->offset = 200;
-    pElement->header = {.length = uLength,
-                        .function = uFunction,
-                        .reserved = 0,
-                        .seqNumber = 2,
-                        .compId = {pCompId[0], pCompId[1], pCompId[2], pCompId[3]},
-                        .threadId = 7,
-                        .timeStamp = 5};
-    std::memcpy(reinterpret_cast<char*>(pElement) + offsetof(trace_queue_element, header) +
-                    sizeof(trace_record_header),
-                bodyBytes.data(), bodyBytes.size());
+    std::memcpy(reinterpret_cast<char*>(pElement) + offsetof(trace_queue_element, header),
+                bytes.data(), bytes.size());
     return element_ptr(pElement);
 }
 
@@ -109,7 +85,8 @@ constexpr char templateText[] = R"(
 0x09 "plain data"
 0x0a "error %d %s %d %s (%s) <%s>"
 0x0b ">>enter"
-0x0c "<<leave"
+0x0c "at %d 100%%\n"
+0x0d "[%T]"
 )";
 
 class record_test : public testing::Test {
@@ -123,8 +100,6 @@ protected:
         anchor.pProgName = "kelvo";
         anchor.iNumberFiles = 1;
         anchor.outputOptions[0] = '\0'; // every line of a body begins with one blank
-        file.pHeader = &header;
-        file.pName = name;
         file.addrMode64 = 1;
     }
 
@@ -135,32 +110,18 @@ protected:
         anchor = {};
     }
 
-    /// The text of one record, without the blank before each line.
-    std::string format(uint16_t uFunction, const body& content, const char* pCompId = "_ZPB") {
-        const element_ptr pElement = make_element(&file, uFunction, content.bytes, pCompId);
-        return format(*pElement);
-    }
-
-    std::string format(trace_queue_element& element) {
+    /// The text of one record.
+    std::string format(uint16_t uFunction, const byte_vector& body,
+                       std::string_view compId = "_ZPB") {
         CaptureStdout();
-        EXPECT_EQ(format_record(&element), 0);
+        EXPECT_EQ(format_record(make_element(&file, uFunction, body, compId).get()), 0);
         stdout_flush();
         return GetCapturedStdout();
     }
 
     temp_dir directory;
     std::string templatePath;
-    trace_file_header header{};
-    char name[8] = "a.trc";
     trace_file file{};
-};
-
-/// A record and its texts by the template and in raw output.
-struct body_case {
-    uint16_t uFunction;
-    body content;
-    std::string byFormat;
-    std::string raw;
 };
 
 std::string hex_line(const std::string& digits, const std::string& characters) {
@@ -170,244 +131,243 @@ std::string hex_line(const std::string& digits, const std::string& characters) {
 }
 
 TEST_F(record_test, bodies_by_format_and_raw) {
-    const std::string threeValues = "[0]=0x00000001 [1]=0x00000002 [2]=0x00000003\n";
-    const body_case cases[] = {
-        {TRC_FUNC_ID, body().u32(1), " bare\n", " id=0x00000001\n"},
-        {TRC_FUNC_INT32, body().u32(2).u32(0xFFFFFFFB), " one -5\n",
-         " id=0x00000002 val=0xfffffffb\n"},
-        {TRC_FUNC_UINT32, body().u32(0x10).u32(5), " id=0x00000010 val=0x00000005\n",
-         " id=0x00000010 val=0x00000005\n"},
-        {TRC_FUNC_UINT32_2, body().u32(3).u32(1).u32(2), " two 1 and 2\n",
-         " id=0x00000003 val1=0x00000001 val2=0x00000002\n"},
-        {TRC_FUNC_INT64, body().u32(4).u64(1ULL << 40), " wide 1099511627776\n",
-         " id=0x00000004 val=0x0000010000000000\n"},
-        {TRC_FUNC_INT64_2, body().u32(5).u64(0xAB).u64(~0ULL), " wide ab, -1\n",
-         " id=0x00000005 val1=0x00000000000000ab val2=0xffffffffffffffff\n"},
+    const struct {
+        uint16_t uFunction;
+        byte_vector body;
+        std::string raw;
+        std::string byFormat{}; ///< empty: the same
+    } cases[] = {
+        {TRC_FUNC_ID, raw_bytes(1U), " id=0x00000001\n", " bare\n"},
+        {TRC_FUNC_INT32, raw_bytes(2U, -5), " id=0x00000002 val=0xfffffffb\n", " one -5\n"},
+        {TRC_FUNC_UINT32, raw_bytes(0x10U, 5U), " id=0x00000010 val=0x00000005\n"},
+        {TRC_FUNC_UINT32_2, raw_bytes(3U, 1U, 2U),
+         " id=0x00000003 val1=0x00000001 val2=0x00000002\n", " two 1 and 2\n"},
+        {TRC_FUNC_INT64, raw_bytes(4U, int64_t{1} << 40), " id=0x00000004 val=0x0000010000000000\n",
+         " wide 1099511627776\n"},
+        {TRC_FUNC_INT64_2, raw_bytes(5U, int64_t{0xAB}, int64_t{-1}),
+         " id=0x00000005 val1=0x00000000000000ab val2=0xffffffffffffffff\n", " wide ab, -1\n"},
+        // The format that is named, as it stands.
+        {TRC_FUNC_INT32, raw_bytes(0xDU, 0xC), " id=0x0000000d val=0x0000000c\n",
+         " [at %d 100%%\n ]\n"},
+        {TRC_FUNC_INT32, raw_bytes(0xDU, 0x7F), " id=0x0000000d val=0x0000007f\n", " []\n"},
         // What no parameter took is dumped.
-        {TRC_FUNC_VALUES, body().u32(6).u32(3).u32(1).u32(2).u32(3),
-         " array 1 2\n\n" + hex_line(" 03000000", "...."), " id=0x00000006 " + threeValues},
-        {TRC_FUNC_VALUES, body().u32(0x20).u32(6).u32(0).u32(1).u32(2).u32(3).u32(4).u32(5),
-         " id=0x00000020\n [0]=0x00000000 [1]=0x00000001 [2]=0x00000002 [3]=0x00000003\n"
-         " [4]=0x00000004 [5]=0x00000005\n",
+        {TRC_FUNC_VALUES, raw_bytes(6U, 3U, 1U, 2U, 3U),
+         " id=0x00000006 [0]=0x00000001 [1]=0x00000002 [2]=0x00000003\n",
+         " array 1 2\n\n" + hex_line(" 03000000", "....")},
+        {TRC_FUNC_VALUES, raw_bytes(0x20U, 6U, 0U, 1U, 2U, 3U, 4U, 5U),
          " id=0x00000020\n [0]=0x00000000 [1]=0x00000001 [2]=0x00000002 [3]=0x00000003\n"
          " [4]=0x00000004 [5]=0x00000005\n"},
-        {TRC_FUNC_VALUES64, body().u32(4).u32(1).u64(0x0000000100000002), " wide 4294967298\n",
-         " id=0x00000004 [0]=0x0000000100000002\n"},
-        {TRC_FUNC_VALUES64, body().u32(5).u32(3).u64(1).u64(2).u64(3),
-         " wide 1, 2\n\n" + hex_line(" 03000000 00000000", "........"),
+        {TRC_FUNC_VALUES64, raw_bytes(4U, 1U, int64_t{0x100000002}),
+         " id=0x00000004 [0]=0x0000000100000002\n", " wide 4294967298\n"},
+        {TRC_FUNC_VALUES64, raw_bytes(5U, 3U, int64_t{1}, int64_t{2}, int64_t{3}),
          " id=0x00000005\n [0]=0x0000000000000001 [1]=0x0000000000000002\n"
-         " [2]=0x0000000000000003\n"},
-        {TRC_FUNC_STRINGS, body().u32(0xFFFFFFFF).u32(1).u32(2).string("a"), "  a\n", "  a\n"},
-        {TRC_FUNC_STRINGS, body().u32(7).u32(2).u32(5).string("a").string("b\n"), " a;b\n\n",
-         " id=0x00000007 \n [0]=a\n [1]=b\n"},
-        {TRC_FUNC_STRING, body().string("text\nmore\n"), "  text\n more\n", "  text\n more\n"},
-        {TRC_FUNC_DISCARDED, body(),
-         " kelvo: 2625-152 Unable to keep up with program being traced, trace records have been "
-         "discarded at this point.\n",
+         " [2]=0x0000000000000003\n",
+         " wide 1, 2\n\n" + hex_line(" 03000000 00000000", "........")},
+        {TRC_FUNC_STRINGS, raw_bytes(0xFFFFFFFF, 1U, 2U, "a\0"sv), "  a\n"},
+        {TRC_FUNC_STRINGS, raw_bytes(7U, 2U, 5U, "a\0b\n\0"sv), " id=0x00000007 \n [0]=a\n [1]=b\n",
+         " a;b\n\n"},
+        {TRC_FUNC_STRING, raw_bytes("text\nmore\n\0"sv), "  text\n more\n"},
+        {TRC_FUNC_DISCARDED,
+         {},
          " kelvo: 2625-152 Unable to keep up with program being traced, trace records have been "
          "discarded at this point.\n"},
-    };
-    for (const body_case& test : cases) {
-        SCOPED_TRACE(testing::Message() << "kind " << test.uFunction << ": " << test.raw);
+        // What is left of a cut array, of strings and of values is written by the
+        // layout of the number as written.
+        {TRC_FUNC_VALUES, raw_bytes(0x20U, ~0U, 9U, "xyz"), " id=0x00000020\n [0]=0x00000009\n"},
+        {TRC_FUNC_STRINGS, raw_bytes(0x20U, ~0U, ~0U, "a\0b"sv),
+         " id=0x00000020 \n [0]=a\n [1]=b\n"},
+        {TRC_FUNC_UINT64_2, raw_bytes(0x20U, uint64_t{2}, 3U),
+         " id=0x00000020 val1=0x0000000000000002 val2=0x0000000000000000\n"}};
+    for (const auto& [uFunction, body, raw, byFormat] : cases) {
+        SCOPED_TRACE(testing::Message() << "kind " << uFunction << ": " << raw);
         anchor.bRaw = 0;
-        EXPECT_EQ(format(test.uFunction, test.content), test.byFormat);
+        EXPECT_EQ(format(uFunction, body), byFormat.empty() ? raw : byFormat);
         anchor.bRaw = 1;
-        EXPECT_EQ(format(test.uFunction, test.content), test.raw);
+        EXPECT_EQ(format(uFunction, body), raw);
     }
 }
 
 TEST_F(record_test, data_blocks) {
-    const std::string heading = " ----------------- Data Block ";
-    const body content = body().u32(8).u32(4).block("\x05").block("abc").block("\x07").block("Z");
-    EXPECT_EQ(format(TRC_FUNC_DATA, content), " data 5 abc\n third %hd\n\n" + hex_line(" 07", ".") +
-                                                  heading + "3 ----------------\n" +
-                                                  hex_line(" 5a", "Z"));
+    const auto heading = [](int iBlock) {
+        return " ----------------- Data Block " + std::to_string(iBlock) + " ----------------\n";
+    };
+    const byte_vector formatted =
+        raw_bytes(8U, 4U, block("\x05"), block("abc"), block("\x07"), block("Z"));
+    EXPECT_EQ(format(TRC_FUNC_DATA, formatted), " data 5 abc\n third %hd\n\n" +
+                                                    hex_line(" 07", ".") + heading(3) +
+                                                    hex_line(" 5a", "Z"));
     // A format without parameters leaves every block to be written.
-    EXPECT_EQ(format(TRC_FUNC_DATA, body().u32(9).u32(1).block("Z")),
-              " plain data\n" + heading + "0 ----------------\n" + hex_line(" 5a", "Z"));
-
-    anchor.bRaw = 1;
-    const body two = body().u32(8).u32(2).block("Z").block("");
-    EXPECT_EQ(format(TRC_FUNC_DATA, two), " id=0x00000008\n" + heading + "0 ----------------\n" +
-                                              hex_line(" 5a", "Z") + heading +
-                                              "1 ----------------\n");
+    EXPECT_EQ(format(TRC_FUNC_DATA, raw_bytes(9U, 1U, block("Z"))),
+              " plain data\n" + heading(0) + hex_line(" 5a", "Z"));
     anchor.bBrief = 1;
-    EXPECT_EQ(format(TRC_FUNC_DATA, two), " id=0x00000008\n");
-    anchor.bRaw = 0;
-    EXPECT_EQ(format(TRC_FUNC_DATA, content), " data 5 abc\n");
-}
+    EXPECT_EQ(format(TRC_FUNC_DATA, formatted), " data 5 abc\n");
 
-TEST_F(record_test, data_blocks_that_overrun_end_with_the_record) {
     anchor.bRaw = 1;
-    const std::string start = " id=0x00000008\n ----------------- Data Block 0 ----------------\n";
+    const byte_vector two = raw_bytes(8U, 2U, block("Z"), block(""));
+    EXPECT_EQ(format(TRC_FUNC_DATA, two), " id=0x00000008\n");
+    anchor.bBrief = 0;
+    EXPECT_EQ(format(TRC_FUNC_DATA, two),
+              " id=0x00000008\n" + heading(0) + hex_line(" 5a", "Z") + heading(1));
+
+    // A block that overruns the record ends with it.
     for (const int32_t iLength : {-1, INT32_MIN, INT32_MAX, 3}) {
-        SCOPED_TRACE(iLength);
-        EXPECT_EQ(format(TRC_FUNC_DATA, body().u32(8).u32(~0U).put(iLength).text("ab")),
-                  start + hex_line(" 6162", "ab"));
+        EXPECT_EQ(format(TRC_FUNC_DATA, raw_bytes(8U, ~0U, iLength, "ab")),
+                  " id=0x00000008\n" + heading(0) + hex_line(" 6162", "ab"))
+            << iLength;
     }
 }
 
 /// An error record with a string argument and an integer one. The strings stand
 /// behind the arguments in the order of the fields.
-body error_body(uint32_t uTraceId, const std::string& ffdcId, const std::string& defaultText) {
+byte_vector error_body(uint32_t uTraceId, const std::string& ffdcId,
+                       const std::string& defaultText) {
     const auto uFirst = static_cast<uint32_t>(sizeof(trace_record_error) + 2 * 16);
     const uint32_t uFile = uFirst + 5, uArgument = uFile + 4, uFfdc = uArgument + 5;
     const auto uDefault = static_cast<uint32_t>(uFfdc + ffdcId.size() + 1);
-    body content;
-    content.u32(uTraceId).u32(0xFFFFFFFE).u32(12).u32(uFirst).u32(uFile);
-    content.u32(ffdcId.empty() ? 0 : uFfdc).u32(1).u32(2).u32(0);
-    content.u32(defaultText.empty() ? 0 : uDefault).u32(2);
-    content.u32(CU_ERROR_ARG_CHAR_STR).u32(0).u64(uArgument);
-    content.u32(CU_ERROR_ARG_INT).u32(0).u64(28);
-    return content.string("open").string("a.c").string("sda1").string(ffdcId).text(defaultText);
+    return raw_bytes(uTraceId, -2, 12U, uFirst, uFile, ffdcId.empty() ? 0U : uFfdc, 1U, 2U, 0U,
+                     defaultText.empty() ? 0U : uDefault, 2U, CU_ERROR_ARG_CHAR_STR, 0U,
+                     uint64_t{uArgument}, CU_ERROR_ARG_INT, 0U, uint64_t{28}, "open\0a.c\0sda1\0"sv,
+                     ffdcId, '\0', defaultText);
 }
 
 TEST_F(record_test, error_records) {
-    const std::string plain = "Error -2 was returned from \"open\" on line 12 in file \"a.c\".\n";
-    EXPECT_EQ(format(TRC_FUNC_ERROR, error_body(0x30, "", "")), " id=0x00000030" + plain);
-    // The default text runs to the end of the record without a NUL.
-    EXPECT_EQ(format(TRC_FUNC_ERROR, error_body(0x30, "ff-1", "disk %s: %d")),
-              " id=0x00000030" + plain + "    Message=disk sda1: 28\n    FFDCID=\"ff-1\"\n");
-    EXPECT_EQ(format(TRC_FUNC_ERROR, error_body(10, "ff-1", "disk %s: %d")),
-              " error -2 open 12 a.c (disk sda1: 28) <ff-1>\n");
-    EXPECT_EQ(format(TRC_FUNC_ERROR, error_body(10, "", "")), " error -2 open 12 a.c () <>\n");
-
+    const std::string plain =
+        " id=0x00000030Error -2 was returned from \"open\" on line 12 in file \"a.c\".\n";
     const std::string longText(10000, 'm');
-    EXPECT_THAT(format(TRC_FUNC_ERROR, error_body(0x30, "", longText)),
-                HasSubstr("Message=" + longText + "\n"));
+    const struct {
+        uint32_t uTraceId;
+        std::string ffdcId;
+        std::string defaultText;
+        std::string expected;
+    } cases[] = {
+        {0x30, "", "", plain},
+        // The default text runs to the end of the record without a NUL.
+        {0x30, "ff-1", "disk %s: %d", plain + "    Message=disk sda1: 28\n    FFDCID=\"ff-1\"\n"},
+        {0x30, "", longText, plain + "    Message=" + longText + "\n"},
+        {10, "ff-1", "disk %s: %d", " error -2 open 12 a.c (disk sda1: 28) <ff-1>\n"},
+        {10, "", "", " error -2 open 12 a.c () <>\n"}};
+    for (const auto& [uTraceId, ffdcId, defaultText, expected] : cases)
+        EXPECT_EQ(format(TRC_FUNC_ERROR, error_body(uTraceId, ffdcId, defaultText)), expected);
 }
 
 TEST_F(record_test, error_records_with_false_offsets_and_counts) {
-    body content = error_body(0x30, "ff-1", "text %s%s%s");
-    const auto patch = [&content](size_t uOffset, uint64_t uValue, size_t uSize) {
-        std::memcpy(content.bytes.data() + uOffset - sizeof(trace_record_header), &uValue, uSize);
-    };
-    for (const size_t uField : {40U, 44U, 48U})
-        patch(uField, 0xFFFFFFF0, 4);
-    patch(offsetof(trace_record_error, argCount), 0xFFFFFFFF, 4);
-    patch(sizeof(trace_record_error) + 8, ~0ULL, 8);
-    const std::string text = format(TRC_FUNC_ERROR, content);
-    EXPECT_THAT(text, HasSubstr("returned from \"\" on line 12 in file \"\".\n    Message=text "));
-    EXPECT_EQ(text.find("FFDCID"), std::string::npos);
+    constexpr uint32_t BEYOND = 0xFFFFFFF0;
+    const byte_vector lying = raw_bytes(0x30U, -2, 12U, BEYOND, BEYOND, BEYOND, 1U, 2U, 0U,
+                                        uint32_t{sizeof(trace_record_error) + 16}, ~0U,
+                                        CU_ERROR_ARG_CHAR_STR, 0U, ~uint64_t{0}, "text %s%s%s");
+    EXPECT_EQ(format(TRC_FUNC_ERROR, lying),
+              " id=0x00000030Error -2 was returned from \"\" on line 12 in file \"\".\n"
+              "    Message=text %s%s\n");
 
     // More arguments than usual.
-    body many;
-    many.u32(0x30).u32(1).u32(2).u32(0).u32(0).u32(0).u32(0).u32(0).u32(0);
-    many.u32(static_cast<uint32_t>(sizeof(trace_record_error) + 40 * 16)).u32(40);
+    byte_vector many = raw_bytes(0x30U, 1U, 2U, 0U, 0U, 0U, 0U, 0U, 0U,
+                                 uint32_t{sizeof(trace_record_error) + 40 * 16}, 40U);
     for (uint64_t i = 0; i < 40; i++)
-        many.u32(CU_ERROR_ARG_LONG_LONG).u32(0).u64(1000 + i);
-    EXPECT_THAT(format(TRC_FUNC_ERROR, many.string("%40$lld!")), HasSubstr("Message=1039!\n"));
+        add_bytes(&many, raw_bytes(CU_ERROR_ARG_LONG_LONG, 0U, 1000 + i));
+    add_bytes(&many, raw_bytes("%40$lld!"));
+    EXPECT_THAT(format(TRC_FUNC_ERROR, many), HasSubstr("Message=1039!\n"));
 }
 
 TEST_F(record_test, start_records_replace_the_time_base) {
     std::strcpy(anchor.outputOptions, "t");
     constexpr uint64_t uHour = 3600ULL * 1000000000;
-    const auto start = [](uint64_t uBase) { return body().u32(3).u32(0x1F).u64(uBase).u64(5); };
+    const auto start = [](uint64_t uBase, std::string_view text = "") {
+        return raw_bytes(3U, 0x1FU, uBase, uint64_t{5}, text);
+    };
 
     // The tracing library's own start record is shown by its own base, with the
     // library's own format; the others by the base so far.
-    const std::string banner = " ******************* Trace Started - Pid = 31 "
-                               "**********************\n";
-    EXPECT_EQ(format(TRC_FUNC_START, start(uHour), "____"), " 01:00:00.000000000 " + banner);
+    EXPECT_EQ(format(TRC_FUNC_START, start(uHour), "____"),
+              " 01:00:00.000000000  ******************* Trace Started - Pid = 31 "
+              "**********************\n");
     EXPECT_EQ(format(TRC_FUNC_START, start(2 * uHour)),
               " 01:00:00.000000000 id=0x00000003[0]=0x0000001f\n");
     EXPECT_EQ(file.timeInfo, (cu_timeinfo{2 * uHour, 5}));
 
-    EXPECT_EQ(format(TRC_FUNC_TIME_CALIBRATION, body().u64(3 * uHour).u64(5)), "");
-    EXPECT_EQ(format(TRC_FUNC_RESTART, start(4 * uHour).string("core"), "____"),
+    EXPECT_EQ(format(TRC_FUNC_TIME_CALIBRATION, raw_bytes(3 * uHour, uint64_t{5})), "");
+    EXPECT_EQ(format(TRC_FUNC_RESTART, start(4 * uHour, "core\0"sv), "____"),
               " 03:00:00.000000000  ***** Trace restarting after client core dump -  Pid = 31 "
               "***** \n                    core\n");
     anchor.bRaw = 1;
-    EXPECT_EQ(format(TRC_FUNC_RESTART, start(5 * uHour).string("core")),
+    EXPECT_EQ(format(TRC_FUNC_RESTART, start(5 * uHour, "core\0"sv)),
               " 04:00:00.000000000 id=0x00000003[0]=0x0000001f\n                    core\n");
     EXPECT_EQ(file.timeInfo, (cu_timeinfo{5 * uHour, 5}));
 }
 
 TEST_F(record_test, records_of_the_tracing_library_end_the_nesting) {
-    const std::string entered = format(TRC_FUNC_ID, body().u32(11));
-    EXPECT_EQ(entered + format(TRC_FUNC_ID, body().u32(1)), " enter\n   bare\n");
-    EXPECT_EQ(format(TRC_FUNC_VALUES, body().u32(32).u32(0)), "   id=0x00000020\n");
-    EXPECT_EQ(format(TRC_FUNC_VALUES, body().u32(32).u32(0), "____"), " id=0x00000020\n");
-    EXPECT_EQ(format(TRC_FUNC_ID, body().u32(1)), " bare\n");
+    EXPECT_EQ(format(TRC_FUNC_ID, raw_bytes(11U)), " enter\n");
+    EXPECT_EQ(format(TRC_FUNC_ID, raw_bytes(1U)), "   bare\n");
+    EXPECT_EQ(format(TRC_FUNC_VALUES, raw_bytes(32U, 0U)), "   id=0x00000020\n");
+    EXPECT_EQ(format(TRC_FUNC_VALUES, raw_bytes(32U, 0U), "____"), " id=0x00000020\n");
+    EXPECT_EQ(format(TRC_FUNC_ID, raw_bytes(1U)), " bare\n");
 }
 
 TEST_F(record_test, unknown_kinds) {
     std::strcpy(anchor.outputOptions, "c");
     for (const unsigned uFunction : {0U, 18U, 20U, 0xFFFFU}) {
         CaptureStderr();
-        EXPECT_EQ(format(static_cast<uint16_t>(uFunction), body().u32(1)), " _ZPB\n");
+        EXPECT_EQ(format(static_cast<uint16_t>(uFunction), raw_bytes(1U)), " _ZPB\n");
         EXPECT_EQ(GetCapturedStderr(),
                   "kelvo: 2625-149 Internal Error, unknown trace record type found.\n\n");
     }
 }
 
-TEST_F(record_test, a_template_without_memory_leaves_the_record_open) {
+TEST_F(record_test, without_memory_a_record_is_left_out_or_open) {
     std::strcpy(anchor.outputOptions, "c");
-    const element_ptr pValue = make_element(&file, TRC_FUNC_INT32, body().u32(2).u32(2).bytes);
-    const element_ptr pData = make_element(&file, TRC_FUNC_DATA, body().u32(8).u32(0).bytes);
+    const element_ptr pValue = make_element(&file, TRC_FUNC_INT32, raw_bytes(2U, 2));
+    const element_ptr pData = make_element(&file, TRC_FUNC_DATA, raw_bytes(8U, 0U));
     CaptureStdout();
-    bCallocFails = true;
-    EXPECT_EQ(format_record(pValue.get()), 1);
-    EXPECT_EQ(format_record(pData.get()), 0); // a data record is closed all the same
-    bCallocFails = false;
+    anchor.bRaw = 1;
+    bAllocationFails = true;
+    EXPECT_EQ(format_record(pValue.get()), 1); // for its thread
+    bAllocationFails = false;
+    EXPECT_EQ(format_record(pValue.get()), 0);
+    anchor.bRaw = 0;
+    bAllocationFails = true;
+    EXPECT_EQ(format_record(pValue.get()), 1); // for its template
+    EXPECT_EQ(format_record(pData.get()), 0);  // a data record is closed all the same
+    bAllocationFails = false;
     EXPECT_EQ(format_record(pValue.get()), 0);
     stdout_flush();
-    EXPECT_EQ(GetCapturedStdout(), " _ZPB\n _ZPB\n _ZPB one 2\n");
-}
-
-/// Formats the record in normal, raw and brief mode.
-void format_in_all_modes(trace_queue_element& element) {
-    for (const int iMode : {0, 1, 2}) {
-        anchor.bRaw = iMode == 1;
-        anchor.bBrief = iMode == 2;
-        EXPECT_EQ(format_record(&element), 0);
-    }
+    EXPECT_EQ(GetCapturedStdout(),
+              " _ZPB id=0x00000002 val=0x00000002\n _ZPB\n _ZPB\n _ZPB one 2\n");
 }
 
 TEST_F(record_test, hostile_bodies_of_every_kind_stay_inside_the_record) {
     std::mt19937 generator(1);
     const auto random = [&generator] { return static_cast<uint32_t>(generator()); };
-    const auto small = [&random] { return random() % 140; };
     const uint32_t words[] = {0, 1, 2, 0x7FFFFFFF, 0x80000000, 0xFFFFFFFF};
     CaptureStdout();
     CaptureStderr();
     for (uint32_t uFunction = 0; uFunction <= 20; uFunction++) {
-        const uint16_t uKind =
-            uFunction == 20 ? uint16_t{TRC_FUNC_DISCARDED} : static_cast<uint16_t>(uFunction);
+        const auto uKind =
+            static_cast<uint16_t>(uFunction < 20 ? uFunction : uint32_t{TRC_FUNC_DISCARDED});
         for (uint32_t uRound = 0; uRound < 300; uRound++) {
-            body content;
-            content.u32(uRound % 13);
+            byte_vector body = raw_bytes(uRound % 13);
             for (uint32_t i = 0; i < uRound % 29; i++)
-                content.u32(random() % 2 ? words[random() % std::size(words)] : small());
-            content.bytes.resize(content.bytes.size() + random() % 4, 's');
+                add_bytes(&body, raw_bytes(random() % 2 ? words[random() % std::size(words)]
+                                                        : random() % 140));
+            body.resize(body.size() + random() % 4, std::byte{'s'});
             // Cut through the fixed fields too.
             if (uRound < 60)
-                content.bytes.resize(uRound, '%');
+                body.resize(uRound, std::byte{'%'});
             const element_ptr pElement =
-                make_element(&file, uKind, content.bytes, uRound % 5 ? "_ZPB" : "____");
-            format_in_all_modes(*pElement);
-            // A length that names more, or less, than the block holds.
-            pElement->header.length += 1000;
-            format_in_all_modes(*pElement);
-            pElement->header.length = random() % 28;
-            format_in_all_modes(*pElement);
+                make_element(&file, uKind, body, uRound % 5 ? "_ZPB" : "____");
+            // The right length, and ones that name more, or less, than the block holds.
+            const uint32_t uLength = pElement->header.length;
+            for (const uint32_t uNamed : {uLength, uLength + 1000, random() % 28}) {
+                pElement->header.length = uNamed;
+                for (const int iMode : {0, 1, 2}) {
+                    anchor.bRaw = iMode == 1;
+                    anchor.bBrief = iMode == 2;
+                    EXPECT_EQ(format_record(pElement.get()), 0);
+                }
+            }
         }
     }
     stdout_flush();
     GetCapturedStderr();
     EXPECT_LT(GetCapturedStdout().size(), 100U << 20);
-}
-
-TEST_F(record_test, what_is_left_of_cut_bodies_is_written) {
-    // What is left of an array and of strings is written by the layout of the
-    // number as written.
-    anchor.bRaw = 1;
-    EXPECT_EQ(format(TRC_FUNC_VALUES, body().u32(1).u32(~0U).u32(9).text("xyz")),
-              " id=0x00000001\n [0]=0x00000009\n");
-    EXPECT_EQ(format(TRC_FUNC_STRINGS, body().u32(1).u32(~0U).u32(~0U).string("a").text("b")),
-              " id=0x00000001 \n [0]=a\n [1]=b\n");
-    EXPECT_EQ(format(TRC_FUNC_UINT64_2, body().u32(1).u64(2).u32(3)),
-              " id=0x00000001 val1=0x0000000000000002 val2=0x0000000000000000\n");
 }
 
 } // namespace
