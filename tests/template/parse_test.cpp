@@ -1,38 +1,20 @@
 #include "parse.h"
 
+#include "search_path.h"
+#include "template_file.h"
 #include "template_support.h"
 
 #include <gtest/gtest.h>
 
-#include <cstdlib>
-#include <random>
+#include <cstdio>
+#include <vector>
 
 namespace {
 
 using namespace std::string_literals;
 
-struct parse_outcome {
-    int iResult = 0;
-    int insufficient_resources = -1;
-    int32_t lineNumber = 0;
-    std::string entries;
-    std::string messages;
-};
-
-parse_outcome parse(const std::string& text) {
-    parse_outcome outcome;
-    const template_owner pTemplate = make_template("ABCD");
-    FILE* const pFile = fmemopen(const_cast<char*>(text.data()), text.size(), "r");
-    outcome.messages = joined_messages_of([&] {
-        outcome.iResult =
-            parse_template_file(pTemplate.get(), "f.tpl", pFile, &outcome.insufficient_resources);
-    });
-    fclose(pFile);
-    outcome.lineNumber = pTemplate->lineNumber;
-    outcome.entries = dump_template(*pTemplate);
-    return outcome;
-}
-
+/// A text, the entries that it gives, oldest first, each as "id:text" or
+/// "id/block:text", and what is said about it.
 struct parse_case {
     std::string text;
     std::string entries;
@@ -41,11 +23,25 @@ struct parse_case {
 
 void expect_parsed(const std::vector<parse_case>& cases) {
     for (const parse_case& test : cases) {
-        const parse_outcome outcome = parse(test.text);
-        EXPECT_EQ(outcome.entries, test.entries) << test.text;
-        EXPECT_EQ(outcome.messages, test.messages) << test.text;
-        EXPECT_EQ(outcome.iResult, 0) << test.text;
-        EXPECT_EQ(outcome.insufficient_resources, 0) << test.text;
+        const template_owner pTemplate = make_template("ABCD");
+        const file_owner pFile(
+            fmemopen(const_cast<char*>(test.text.data()), test.text.size(), "r"));
+        int insufficient_resources = -1;
+        const std::string messages = messages_of([&] {
+            EXPECT_EQ(
+                parse_template_file(pTemplate.get(), "f.tpl", pFile.get(), &insufficient_resources),
+                0);
+        });
+        std::string entries;
+        for (const format_entry* pEntry = pTemplate->pFormats; pEntry; pEntry = pEntry->pNext) {
+            const std::string block =
+                pEntry->block_id == -1 ? "" : "/" + std::to_string(pEntry->block_id);
+            entries = std::to_string(pEntry->trace_id) + block + ":" + pEntry->pString +
+                      (entries.empty() ? "" : " ") + entries;
+        }
+        EXPECT_EQ(entries, test.entries) << test.text;
+        EXPECT_EQ(messages, test.messages) << test.text;
+        EXPECT_EQ(insufficient_resources, 0) << test.text;
     }
 }
 
@@ -69,25 +65,13 @@ std::string too_long_id(int line) {
            " of file f.tpl is too long to be parsed.";
 }
 
-class Parse : public testing::Test {
-protected:
-    void SetUp() override {
-        anchor.pProgName = "kelvo";
-    }
-    void TearDown() override {
-        std::free(anchor.pFormatBuffer);
-        anchor.pFormatBuffer = nullptr;
-        anchor.lenFormatBuffer = 0;
-    }
-};
-
-TEST_F(Parse, EntriesJoinTheirStrings) {
+TEST(Parse, EntriesJoinTheirStrings) {
     expect_parsed({
         {"", "", ""},
         {" \t\v\f\r\n# only a comment\n#and one without an end", "", ""},
         {"1 \"a\"", "1:a", ""},
         {"1 \"a\" # comment \"x\" 2\n\n\"b\"\"c\" 2\n\"d\"\n", "1:abc 2:d", ""},
-        {"1 \"a#\nb\"", "1:a#\nb", ""},
+        {"1 \"a#\nb\" x", "1:a#\nb", unrecognized('x', 1)},
         {"1:0 \"a\"1:7 \"b\"1 \"c\" 1:0 \"d\"", "1/0:a 1/7:b 1:c 1/0:d", ""},
         {"1: \"a\"", "1/0:a", ""},
         {"\"before\" 1 \"a\"", "1:a", ""},
@@ -95,10 +79,9 @@ TEST_F(Parse, EntriesJoinTheirStrings) {
         {"1 \"a\0b\" 2 \"\0\""s, "1:a 2:", ""}, // a NUL ends the compiled text
         {"1 \"a\" x\n\"b\"", "1:ab", unrecognized('x', 0)},
     });
-    EXPECT_EQ(parse("\n\n1 \"\n\"\n").lineNumber, 4);
 }
 
-TEST_F(Parse, EscapesAreReplacedOnceAndOthersStay) {
+TEST(Parse, EscapesAreReplacedOnceAndOthersStay) {
     expect_parsed({
         {R"(1 "\a\b\f\n\r\t\v\?\"\\")", "1:\a\b\f\n\r\t\v?\"\\", ""},
         {R"(1 "\\n\\\n\"")", "1:\\n\\\n\"", ""},
@@ -107,7 +90,7 @@ TEST_F(Parse, EscapesAreReplacedOnceAndOthersStay) {
     });
 }
 
-TEST_F(Parse, IdsAreNumbersOfAutomaticBase) {
+TEST(Parse, IdsAreNumbersOfAutomaticBase) {
     expect_parsed({
         {"010 \"a\" 0x1F \"b\" 0xaBc \"c\" 0 \"d\"", "8:a 31:b 2748:c 0:d", ""},
         {"0xFFFFFFFE \"a\" 0x100000005 \"b\" 4294967303 \"c\"", "-2:a 5:b 7:c", ""},
@@ -135,7 +118,7 @@ TEST_F(Parse, IdsAreNumbersOfAutomaticBase) {
     });
 }
 
-TEST_F(Parse, SyntaxErrorsSkipTheRestOfTheLine) {
+TEST(Parse, SyntaxErrorsSkipTheRestOfTheLine) {
     expect_parsed({
         {"1 2 \"a\"\n3 \"b\"", "3:b", two_ids(0)},
         {"1 \"\" 2 \"a\"", "", two_ids(0)},
@@ -155,54 +138,15 @@ TEST_F(Parse, SyntaxErrorsSkipTheRestOfTheLine) {
     });
 }
 
-TEST_F(Parse, FormatStringLimit) {
+TEST(Parse, FormatStringLimit) {
     const std::string longest(1048575, 'a');
-    parse_outcome outcome = parse("1 \"" + longest + "\" 2 \"b\"");
-    EXPECT_EQ(outcome.messages, "");
-    EXPECT_EQ(outcome.entries, "1:" + longest + " 2:b");
+    const std::string tooLong = "2625-125 Format string is too long on line 0 of f.tpl.";
+    expect_parsed({
+        {"1 \"" + longest + "\" 2 \"b\"", "1:" + longest + " 2:b", ""},
+        {"1 \"" + longest + "a\" \"x\"\n2 \"b\"\n3 \"c\"", "3:c", tooLong + " | " + two_ids(1)},
+        {"1 \"" + longest + "\" \"aa\n\"b\"\n", "1:b", tooLong},
+    });
     EXPECT_EQ(anchor.lenFormatBuffer, 1048576);
-
-    outcome = parse("1 \"" + longest + "a\" \"x\"\n2 \"b\"\n3 \"c\"");
-    EXPECT_EQ(outcome.messages,
-              "2625-125 Format string is too long on line 0 of f.tpl. | " + two_ids(1));
-    EXPECT_EQ(outcome.entries, "3:c");
-
-    outcome = parse("1 \"" + longest + "\" \"aa\n\"b\"\n");
-    EXPECT_EQ(outcome.messages, "2625-125 Format string is too long on line 0 of f.tpl.");
-    EXPECT_EQ(outcome.entries, "1:b");
-}
-
-TEST_F(Parse, RefusedFormatEndsTheParse) {
-    const parse_outcome outcome = parse("1 \"a\"\n2 \"%q\"\n\n3 \"c\"\n4 x\n");
-    EXPECT_EQ(outcome.iResult, 1);
-    EXPECT_EQ(outcome.insufficient_resources, 0);
-    EXPECT_EQ(outcome.entries, "1:a");
-    // Compiled, and so reported, when the next trace id begins.
-    EXPECT_EQ(outcome.messages, "2625-120 Format error on line 3. Invalid data type q specified.");
-}
-
-TEST_F(Parse, OnlyTheFormatBufferSetsTheMemoryFlag) {
-    const template_owner pTemplate = make_template("ABCD");
-    int insufficient_resources = 0;
-    const auto parse_with = [&](int iAllocations, const std::string& text) {
-        FILE* const pFile = fmemopen(const_cast<char*>(text.data()), text.size(), "r");
-        setvbuf(pFile, nullptr, _IONBF, 0);
-        const allocation_limit limit(iAllocations);
-        insufficient_resources = -1;
-        const int iResult =
-            parse_template_file(pTemplate.get(), "f", pFile, &insufficient_resources);
-        fclose(pFile);
-        return iResult;
-    };
-    EXPECT_EQ(parse_with(0, "1 \"a\""), 1); // the buffer
-    EXPECT_EQ(insufficient_resources, 1);
-    EXPECT_EQ(parse_with(1, "1 \"a\""), 1); // the entry
-    EXPECT_EQ(insufficient_resources, 0);
-    EXPECT_EQ(parse_with(0, "1 \"" + std::string(4097, 'a') + '"'), 1); // a larger buffer
-    EXPECT_EQ(insufficient_resources, 1);
-    EXPECT_EQ(anchor.lenFormatBuffer, 4096);
-    EXPECT_EQ(parse_with(1, "1 \"" + std::string(4095, 'a') + '"'), 0);
-    EXPECT_EQ(insufficient_resources, 0);
 }
 
 } // namespace
