@@ -44,12 +44,7 @@ namespace {
 using byte_vector = std::vector<std::byte>;
 using namespace std::string_view_literals;
 
-struct block_deleter {
-    void operator()(trace_queue_element* pElement) const {
-        std::free(pElement);
-    }
-};
-using element_ptr = std::unique_ptr<trace_queue_element, block_deleter>;
+using element_ptr = std::unique_ptr<trace_queue_element, void (*)(void*)>;
 
 /// An element in a heap block of its exact size, so that the address sanitizer
 /// sees every step beyond it.
@@ -69,7 +64,7 @@ element_ptr make_element(trace_file* pFile, uint16_t uFunction, const byte_vecto
     pElement->length = static_cast<uint32_t>(uBlock);
     std::memcpy(reinterpret_cast<char*>(pElement) + offsetof(trace_queue_element, header),
                 bytes.data(), bytes.size());
-    return element_ptr(pElement);
+    return {pElement, std::free};
 }
 
 constexpr char templateText[] = R"(
@@ -234,20 +229,17 @@ TEST_F(record_test, error_records) {
     const std::string plain =
         " id=0x00000030Error -2 was returned from \"open\" on line 12 in file \"a.c\".\n";
     const std::string longText(10000, 'm');
-    const struct {
-        uint32_t uTraceId;
-        std::string ffdcId;
-        std::string defaultText;
-        std::string expected;
-    } cases[] = {
-        {0x30, "", "", plain},
-        // The default text runs to the end of the record without a NUL.
-        {0x30, "ff-1", "disk %s: %d", plain + "    Message=disk sda1: 28\n    FFDCID=\"ff-1\"\n"},
-        {0x30, "", longText, plain + "    Message=" + longText + "\n"},
-        {10, "ff-1", "disk %s: %d", " error -2 open 12 a.c (disk sda1: 28) <ff-1>\n"},
-        {10, "", "", " error -2 open 12 a.c () <>\n"}};
-    for (const auto& [uTraceId, ffdcId, defaultText, expected] : cases)
-        EXPECT_EQ(format(TRC_FUNC_ERROR, error_body(uTraceId, ffdcId, defaultText)), expected);
+    const auto text_of = [this](uint32_t uTraceId, const std::string& ffdcId,
+                                const std::string& defaultText) {
+        return format(TRC_FUNC_ERROR, error_body(uTraceId, ffdcId, defaultText));
+    };
+    EXPECT_EQ(text_of(0x30, "", ""), plain);
+    // The default text runs to the end of the record without a NUL.
+    EXPECT_EQ(text_of(0x30, "ff-1", "disk %s: %d"),
+              plain + "    Message=disk sda1: 28\n    FFDCID=\"ff-1\"\n");
+    EXPECT_EQ(text_of(0x30, "", longText), plain + "    Message=" + longText + "\n");
+    EXPECT_EQ(text_of(10, "ff-1", "disk %s: %d"), " error -2 open 12 a.c (disk sda1: 28) <ff-1>\n");
+    EXPECT_EQ(text_of(10, "", ""), " error -2 open 12 a.c () <>\n");
 }
 
 TEST_F(record_test, error_records_with_false_offsets_and_counts) {
