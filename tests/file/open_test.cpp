@@ -289,7 +289,9 @@ TEST_F(Open, gives_all_of_an_oversized_mapping_back) {
     }
 }
 
-TEST_F(Open, of_the_first_file_sets_the_time_zone) {
+TEST_F(Open, of_the_first_file_sets_the_time_zone_and_the_start) {
+    std::string sRefused = "+r";
+    anchor.pStartRecordOptArg = sRefused.data();
     static constexpr char UNCHANGED[] = "EST5";
     const struct {
         int32_t tz_offset;
@@ -317,10 +319,13 @@ TEST_F(Open, of_the_first_file_sets_the_time_zone) {
         setenv("TZ", UNCHANGED, 1);
         anchor.bHostTZ = 0;
         anchor.bLocalTZ = test.bLocalTZ;
+        anchor.bStartRecOpt = test.fileIndex != 0; // when no file was first
         end(open_file(raw, 0, 2, test.fileIndex));
         EXPECT_STREQ(getenv("TZ"), test.pZone);
         EXPECT_EQ(anchor.bHostTZ, test.pZone != UNCHANGED);
     }
+    anchor.bStartRecOpt = 0;
+    anchor.pStartRecordOptArg = nullptr;
 }
 
 } // namespace
