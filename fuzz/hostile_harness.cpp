@@ -2,8 +2,8 @@
 
 #include "accept.h"
 #include "first_record.h"
-#include "output_queue.h"
 #include "record.h"
+#include "record_batch.h"
 #include "record_copy.h"
 #include "ring.h"
 #include "shared_words.h"
@@ -131,15 +131,17 @@ struct reading {
 
 void take_record(reading& run, const trace_record_header& header) {
     trace_file* const pTraceFile = run.pTraceFile;
-    const element_ptr pElement(copy_record(pTraceFile, header));
-    hostile_check(pElement != nullptr, "memory lasts");
+    const trace_bytes record = record_at_reader(pTraceFile, header);
+    void* const pRoom = malloc(record.size() + QUEUE_ELEMENT_OVERHEAD);
+    hostile_check(pRoom != nullptr, "memory lasts");
+    const element_ptr pElement(copy_record(pTraceFile, header, record, pRoom));
     const uint32_t uLength = pElement->header.length;
     hostile_check(pElement->length == uLength + QUEUE_ELEMENT_OVERHEAD &&
                       uLength >= sizeof(trace_record_header) && uLength <= header.length &&
                       pElement->offset <= pTraceFile->uSize &&
                       uLength <= pTraceFile->uSize - pElement->offset,
                   "a queued record lies inside the file");
-    (void)queue_entry_time(make_queue_entry(pElement.get()));
+    (void)brought_time_base(pElement.get());
     write_record(pElement.get(), run.options.uForms);
     ++run.result.uWritten;
     if (run.options.onWritten)

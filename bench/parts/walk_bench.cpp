@@ -1,9 +1,9 @@
 // The walk round a ring in memory, alone and with the copies of the records.
 #include "records.h"
 
-#include "element_memory.h"
 #include "first_record.h"
-#include "record_copy.h"
+#include "merge_file.h"
+#include "record_batch.h"
 #include "walk.h"
 
 #include <benchmark/benchmark.h>
@@ -70,17 +70,19 @@ BENCHMARK(walk);
 
 void walk_and_copy(benchmark::State& state) {
     memory_ring ring;
-    element_memory memory;
-    std::vector<trace_queue_element*> elements;
-    elements.reserve(RECORDS);
+    merge_file file{};
+    file.pFile = &ring.file;
+    cu_timeinfo base{};
     for (auto _ : state) {
-        const bool bAll = go_round(&ring.file, [&](const trace_record_header& header) {
-            elements.push_back(copy_record(&ring.file, header, &memory));
-        });
+        batch_writer records(&file);
+        bool bAll = true;
+        bAll = go_round(&ring.file,
+                        [&](const trace_record_header& header) {
+                            bAll = records.add(header, &base) && bAll;
+                        }) &&
+               bAll;
         if (!bAll)
             state.SkipWithError("not all records were found");
-        release_elements(elements);
-        elements.clear();
     }
     state.SetItemsProcessed(state.iterations() * int64_t{RECORDS});
 }

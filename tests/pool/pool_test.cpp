@@ -77,9 +77,9 @@ struct gate_t {
 
 gate_t gate;
 
-void* pass_gate(void* pTask) {
+task_wish pass_gate(void* pTask) {
     gate.pass(pTask);
-    return nullptr;
+    return {task_wish::ENDED};
 }
 
 std::array<std::atomic<pthread_t>, 64> ids;
@@ -175,14 +175,49 @@ TEST(Pool, ClosingDropsWhatHasNotBegun) {
     });
 }
 
-/// None of the tasks ends before all have begun: each needs a thread of its own,
-/// however few threads have woken up when the next one comes.
-TEST(Pool, EveryTaskGetsAThreadOfItsOwn) {
+// ------------------------------------------------------------------- steps
+
+struct stepping {
+    std::atomic<int> iSteps;
+    std::atomic<bool> bOnThread; ///< two steps of a task at a time would be a fault
+    thrd_task* pPoolTask;
+};
+constexpr int STEPS = 2000;
+std::array<stepping, 8> steppings;
+std::atomic<int> iEnded;
+
+/// Every second step is wished for soon, the others must be asked for.
+task_wish step(void* pTask) {
+    auto& self = *static_cast<stepping*>(pTask);
+    EXPECT_FALSE(self.bOnThread.exchange(true));
+    const int iStep = ++self.iSteps;
+    task_wish wish{task_wish::SUSPENDED};
+    if (iStep == STEPS)
+        wish = {task_wish::ENDED};
+    else if (iStep % 2 == 0)
+        wish = {task_wish::LATER, iStep % 4 == 0 ? pool_now() + 1000 * (iStep % 50) : 0};
+    self.bOnThread = false;
+    if (wish.kind == task_wish::ENDED)
+        ++iEnded;
+    else if (wish.kind == task_wish::SUSPENDED)
+        poolResumeTask(self.pPoolTask); // sooner than it can have left the thread
+    return wish;
+}
+
+TEST(Pool, GivesATaskItsStepsOneByOneAsItWishes) {
     in_own_process([] {
-        start_pool();
-        add_tasks(0, tasks.size());
-        gate.wait_for_entered(tasks.size());
-        open_gate_and_close_pool();
+        pool_task_main = step;
+        anchor.pProgName = "kelvo";
+        ASSERT_EQ(startNewThreadPool(), 0);
+        for (size_t i = 0; i < steppings.size(); ++i)
+            ASSERT_EQ(poolAddNewTask(&ids[i], &steppings[i], &steppings[i].pPoolTask), 0);
+        while (iEnded != static_cast<int>(steppings.size()))
+            sched_yield();
+        EXPECT_EQ(totalThrdsInPool.load(), 16U) << "steps need no threads of their own";
+        while (!endThrdPool()) {
+        }
+        for (const stepping& each : steppings)
+            EXPECT_EQ(each.iSteps, STEPS);
     });
 }
 

@@ -165,16 +165,15 @@ struct thread_info {
 };
 
 struct trace_queue_element;
-struct file_run;
 
 /// One trace file of the run. Made in one block with its path, all zero but fd.
 ///
 /// Who may touch what once the file's reader runs:
 /// - the reader task: mapping pointers, fd, uSize, start state, walk state;
-/// - the main thread: timeInfo (replaced under priorityQmutex), pThreadInfo,
-///   modTime from the first queued record on until the reader closes the file,
-///   which it does only when none of its records is queued or being formatted;
-/// - under priorityQmutex: numRecPushed, bRecUnderProcess, bTimeBaseInQueue.
+/// - the main thread: timeInfo, pThreadInfo and modTime from the first queued record
+///   on until the reader closes the file, which it does only when none of its records
+///   is queued or being formatted;
+/// - under priorityQmutex: numRecPushed.
 ///
 /// What the reader writes at every record, what the main thread writes at every
 /// record, and what both only read lie in cache lines apart.
@@ -207,22 +206,14 @@ struct trace_file {
     int timeStampIsValid;                 ///< modTime holds a time
     thread_info* pThreadInfo;
     alignas(CACHE_LINE) uint32_t queueDepth;
-    uint32_t numRecPushed;             ///< records now in the output queue
+    uint32_t numRecPushed;             ///< records in the output queue or being formatted
     uint32_t index2;                   ///< position in the sorted pre-processing list
     std::atomic<int> bErrorProcessing; ///< reading could not be started
-    int bRecUnderProcess;              ///< records of this file are being formatted
 
     // Not part of the format of the record, but kept beside it:
     alignas(CACHE_LINE) uint8_t uPlatform; ///< the writer's platform code, taken at open
     int bAccepted;      ///< the header was validated: the two reader words may be stored
     size_t uMappedSize; ///< bytes mapped at pHeader; uSize is its low 32 bits
-    alignas(CACHE_LINE) int bTimeBaseInQueue; ///< a record that changes timeInfo is queued and not
-                                              ///< yet formatted
-    file_run* pQueuedRun;    ///< this file's records in the output queue; made by the queue
-    pthread_cond_t roomCond; ///< signalled when the reader may push again, or close the file
-    int bWaitsForRoom;       ///< the reader waits on roomCond
-    uint32_t uRoomAt;        ///< it is to be woken at this numRecPushed
-    int bRunning;            ///< the reader was started and has not finished
 };
 
 /// trace_file::startOptions.
@@ -273,18 +264,13 @@ struct TrcPreProcHdrElem {
 
 /// Shared state of the merge.
 struct TrcFmtngProcCtrl {
-    pthread_mutex_t priorityQmutex;   ///< recursive; guards the output queue and all below
-    std::atomic<uint32_t> queueDepth; ///< elements in TrcOutput_Q; written under the mutex
+    pthread_mutex_t priorityQmutex;   ///< recursive; guards what readers push and all below
+    std::atomic<uint32_t> queueDepth; ///< elements pushed and not yet formatted; written under it
     uint64_t PushSeqn;                ///< for the next push
     std::atomic<uint32_t>
         uNextUnOpenFileIdx;         ///< list elements started or tried; written under the mutex
     uint32_t uTrcPreProcHdrListLen; ///< elements allocated
     TrcPreProcHdrElem* pTrcPreProcHdrList; ///< outside follow mode only
-
-    // Kept beside, under the mutex:
-    uint32_t uRunningFiles;           ///< files whose reader was started and has not finished
-    uint32_t uFilesWithNothingQueued; ///< those of them that have no record in the queue
-    uint32_t uFinishedFiles;          ///< files whose reader has finished or could not start
 };
 
 // ------------------------------------------------------------------ globals

@@ -1,7 +1,7 @@
 #include "run.h"
 
 #include "cleanup.h"
-#include "element_memory.h"
+#include "file_starts.h"
 #include "handover.h"
 #include "insufficient.h"
 #include "kelvo.h"
@@ -9,11 +9,12 @@
 #include "messages.h"
 #include "mutex.h"
 #include "open.h"
-#include "output_queue.h"
 #include "pool.h"
 #include "print.h"
 #include "progress.h"
 #include "reader.h"
+#include "record.h"
+#include "record_batch.h"
 #include "signals.h"
 #include "stdout_stream.h"
 #include "store.h"
@@ -33,7 +34,7 @@ constexpr int64_t LOW_MEMORY_PAUSE_US = 30'000'000;
 
 bool allocate_file_list(uint32_t total_files) {
     ctrl.pTrcPreProcHdrList = new (std::nothrow) TrcPreProcHdrElem[total_files]();
-    if (ctrl.pTrcPreProcHdrList == nullptr)
+    if (ctrl.pTrcPreProcHdrList == nullptr || !reserve_merge_files(total_files))
         return false;
     ctrl.uTrcPreProcHdrListLen = total_files;
     total_tf_count = total_files;
@@ -52,7 +53,7 @@ void add_file(trace_file* pTraceFile, uint32_t fileIndex) {
 /// Starts the reader of a file in follow mode. Returns 0 or -1.
 int start_following(trace_file* pTraceFile) {
     const mutex_guard guard(ctrl.priorityQmutex);
-    return start_tracefile_processing(pTraceFile);
+    return start_tracefile_processing(pTraceFile, nullptr);
 }
 
 /// Opens one file argument and adds it to the run. Returns 0 or -1.
@@ -115,6 +116,26 @@ void start_merging() {
     TrcFileProcessingCtrl(nullptr, 0);
 }
 
+// ------------------------------------------------------------------ records
+
+/// Prints the records, and lives through what else may happen between them.
+class text_output final : public merge_listener {
+public:
+    void take_record(trace_queue_element* pElement) override {
+        if (format_record(pElement) != 0)
+            warn_insufficient_resources(pElement->pFile->pName, ctrl.queueDepth);
+    }
+    void between_records() override {
+        write_handed_over_output();
+        take_pending_signal();
+    }
+    void wait(int64_t iMicroseconds) override {
+        if (anchor.bFollow && !stdout_is_empty())
+            stdout_flush(); // whoever reads a pipe sees the records at once
+        main_thread_sleep(iMicroseconds);
+    }
+};
+
 // ------------------------------------------------------------ around the run
 
 /// Minutes east of UTC, as the line names them.
@@ -141,6 +162,7 @@ int process_files(const command_line& command) {
     if (!allocate_file_list(static_cast<uint32_t>(command.files.size())))
         return 1;
     pool_task_main = thread_main;
+    file_was_read = [] { kelvo_progress_status(); };
     if (startNewThreadPool() == -1)
         return 1;
     if (!anchor.bFollow)
@@ -152,7 +174,8 @@ int process_files(const command_line& command) {
         start_merging();
     if (anchor.bHostTZ)
         print_time_zone();
-    merge_records();
+    text_output output;
+    merge_records(output);
     print_totals();
     if (!anchor.bFollow && bShowProgress)
         output_err_text("\n");
@@ -163,7 +186,7 @@ int process_files(const command_line& command) {
 int end_run(int bError) {
     bReadersMayRun = !endThrdPool();
     if (!bReadersMayRun) {
-        TrcOutput_Q.release();
+        release_merge_files();
         release_kept_blocks();
     }
     cleanup(0);

@@ -1,11 +1,13 @@
-// One queue of tasks, one mutex over it and over both counters, and threads
-// that take tasks from its head until the pool is closed.
+// One queue of tasks, a heap of those that wait for a moment, one mutex over both
+// and over both counters, and threads that take tasks from the head of the queue
+// until the pool is closed.
 //
-// Idle threads post one lookout, which looks at the queue again after an
-// interval on behalf of all of them; the others sleep until they are woken. A
-// new task wakes one thread at once, whichever it is, and closing wakes all.
-// So the interval bounds how long a thread can miss something, and an idle
-// pool costs one short wake-up per interval whatever its size.
+// Steps are short, so a task that comes while as many threads are at work as the
+// machine has processors is left to those: to wake a thread costs more than most
+// steps. Lest such a task waits behind steps that do not move (a page that has to
+// be read, a standard error that nobody reads), one idle thread, the lookout,
+// looks at the queue again after an interval. The lookout also waits for the
+// earliest moment. Nobody looks while nothing waits: an idle pool costs nothing.
 //
 // Threads are detached. Everything that a leaving thread touches after it has
 // counted itself out is static and trivially destructible, so that it may still
@@ -19,40 +21,38 @@
 
 #include <algorithm>
 #include <csignal>
+#include <cstdlib>
 #include <ctime>
 #include <memory>
 #include <new>
+#include <sched.h>
 
-void* (*pool_task_main)(void* pTask) = nullptr;
+task_wish (*pool_task_main)(void* pTask) = nullptr;
 
 std::atomic<uint32_t> totalThrdsInPool{0};
 std::atomic<uint32_t> totalFreeThrdsInPool{0};
-
-namespace {
-
-/// Tasks queued and not yet taken: each of them has a claim on a free thread.
-std::atomic<uint32_t> totalWaitingTasks{0};
-
-constexpr int THREADS_AT_START = 16;
-constexpr int THREADS_PER_GROWTH = 4;
-constexpr uint32_t FEWEST_FREE_THREADS = 3; // beyond those that waiting tasks will take
-
-// Microseconds.
-constexpr int64_t IDLE_INTERVAL = 1500;
-constexpr int64_t LONGEST_IDLE_INTERVAL = 100000; // nothing depends on it: a task wakes at once
-constexpr int64_t CLOSE_INTERVAL = 10000;
-constexpr int CLOSE_ATTEMPTS = 10;
-
-/// The signals that pool threads leave to the main thread.
-constexpr int ASYNCHRONOUS_SIGNALS[] = {
-    SIGHUP,  SIGINT,  SIGQUIT, SIGUSR1, SIGUSR2, SIGALRM,   SIGTERM, SIGCHLD,  SIGCONT, SIGTSTP,
-    SIGTTIN, SIGTTOU, SIGURG,  SIGXCPU, SIGXFSZ, SIGVTALRM, SIGPROF, SIGWINCH, SIGIO,   SIGPWR,
-};
 
 struct thrd_task {
     thrd_task* pNextTask;                   ///< null at the tail
     void* pTask;                            ///< argument of pool_task_main
     std::atomic<pthread_t>* pServiceThrdId; ///< holds the running thread's id, then 0
+    bool bOnThread;                         ///< a step runs
+    bool bResumed;                          ///< the step that runs is followed by another one
+};
+
+namespace {
+
+constexpr int THREADS_AT_START = 16;
+constexpr int THREADS_PER_GROWTH = 4;
+constexpr uint32_t FEWEST_FREE_THREADS = 3;
+
+constexpr int64_t LOOKOUT_INTERVAL_NS = 1'500'000;
+constexpr int64_t CLOSE_WAIT_NS = 100'000'000;
+
+/// The signals that pool threads leave to the main thread.
+constexpr int ASYNCHRONOUS_SIGNALS[] = {
+    SIGHUP,  SIGINT,  SIGQUIT, SIGUSR1, SIGUSR2, SIGALRM,   SIGTERM, SIGCHLD,  SIGCONT, SIGTSTP,
+    SIGTTIN, SIGTTOU, SIGURG,  SIGXCPU, SIGXFSZ, SIGVTALRM, SIGPROF, SIGWINCH, SIGIO,   SIGPWR,
 };
 
 /// First in, first out; both null when empty.
@@ -61,12 +61,23 @@ struct thrd_task_list {
     thrd_task* pLastTask;
 };
 
+/// A task that waits for its moment.
+struct timed_task {
+    int64_t iMoment;
+    thrd_task* pTask;
+};
+
 pthread_mutex_t thrd_pool_mutex = PTHREAD_MUTEX_INITIALIZER;
 
 // Under thrd_pool_mutex:
 thrd_task_list list_head{};
 thrd_task_list* task_queue = &list_head; ///< CLOSED_POOL once the pool is closed
-bool bLookoutPosted = false;
+timed_task* pTimedTasks = nullptr;       ///< heap, the earliest moment on top
+uint32_t uTimedTasks = 0;
+uint32_t uTimedRoom = 0; ///< entries allocated; as many as there are tasks, at least
+uint32_t uTasks = 0;     ///< tasks in the pool's care
+uint32_t uProcessors = 1;
+int64_t iLookoutUntil = 0; ///< what the lookout waits for; 0: there is none
 pthread_cond_t newsCond = PTHREAD_COND_INITIALIZER;  ///< a task came, or the pool was closed
 pthread_cond_t emptyCond = PTHREAD_COND_INITIALIZER; ///< the last thread has left
 
@@ -74,21 +85,25 @@ thrd_task_list* const CLOSED_POOL = reinterpret_cast<thrd_task_list*>(~uintptr_t
 
 // ------------------------------------------------- with thrd_pool_mutex held
 
+bool enough_threads_are_free() {
+    return totalFreeThrdsInPool >= FEWEST_FREE_THREADS;
+}
+
 bool is_closed() {
     return task_queue == CLOSED_POOL;
 }
 
+bool a_task_waits() {
+    return task_queue->pFirstTask != nullptr;
+}
+
 void append_task(thrd_task* pTask) {
-    if (task_queue->pLastTask != nullptr)
+    pTask->pNextTask = nullptr;
+    if (a_task_waits())
         task_queue->pLastTask->pNextTask = pTask;
     else
         task_queue->pFirstTask = pTask;
     task_queue->pLastTask = pTask;
-    ++totalWaitingTasks;
-}
-
-bool enough_threads_are_free() {
-    return totalFreeThrdsInPool >= FEWEST_FREE_THREADS + totalWaitingTasks;
 }
 
 /// The task at the head, now the caller's; the queue is not empty.
@@ -97,74 +112,139 @@ thrd_task* take_first_task() {
     task_queue->pFirstTask = pTask->pNextTask;
     if (task_queue->pFirstTask == nullptr)
         task_queue->pLastTask = nullptr;
-    --totalWaitingTasks;
     return pTask;
 }
 
+bool is_later(const timed_task& first, const timed_task& second) {
+    return first.iMoment > second.iMoment;
+}
+
+/// There is room: poolAddNewTask has seen to it.
+void add_timed_task(const timed_task& added) {
+    pTimedTasks[uTimedTasks++] = added;
+    std::push_heap(pTimedTasks, pTimedTasks + uTimedTasks, is_later);
+}
+
+thrd_task* take_earliest_task() {
+    std::pop_heap(pTimedTasks, pTimedTasks + uTimedTasks, is_later);
+    return pTimedTasks[--uTimedTasks].pTask;
+}
+
+/// Queues the tasks whose moment has come.
+void queue_due_tasks() {
+    if (uTimedTasks == 0)
+        return;
+    const int64_t iNow = pool_now();
+    while (uTimedTasks != 0 && pTimedTasks[0].iMoment <= iNow)
+        append_task(take_earliest_task());
+}
+
+/// Makes room for the moment of one more task.
+bool reserve_timed_task() {
+    if (uTasks < uTimedRoom)
+        return true;
+    const uint32_t uRoom = uTimedRoom == 0 ? 64 : 2 * uTimedRoom;
+    void* const pGrown = realloc(pTimedTasks, uRoom * sizeof(timed_task));
+    if (pGrown == nullptr)
+        return false;
+    pTimedTasks = static_cast<timed_task*>(pGrown);
+    uTimedRoom = uRoom;
+    return true;
+}
+
+/// Sees to it that somebody takes the tasks that wait, or looks out for the
+/// moments.
+void wake_thread_for_task() {
+    const uint32_t uFree = totalFreeThrdsInPool;
+    const bool bNobodyLooks = iLookoutUntil == 0;
+    const bool bNeeded = a_task_waits() ? bNobodyLooks || totalThrdsInPool - uFree < uProcessors
+                                        : bNobodyLooks && uTimedTasks != 0;
+    if (bNeeded && uFree != 0)
+        pthread_cond_signal(&newsCond);
+}
+
+void forget_task(thrd_task* pTask) {
+    delete pTask;
+    --uTasks;
+}
+
 void close_pool() {
-    while (task_queue->pFirstTask != nullptr)
-        delete take_first_task();
+    while (a_task_waits())
+        forget_task(take_first_task());
+    while (uTimedTasks != 0)
+        forget_task(take_earliest_task());
+    free(pTimedTasks);
+    pTimedTasks = nullptr;
     task_queue = CLOSED_POOL;
     pthread_cond_broadcast(&newsCond);
 }
 
-/// The moment `iMicroseconds` from now, on the clock that wait_until goes by.
-timespec after(int64_t iMicroseconds) {
-    timespec moment;
-    clock_gettime(CLOCK_MONOTONIC, &moment);
-    const int64_t iNanoseconds = moment.tv_nsec + iMicroseconds * 1000;
-    moment.tv_sec += static_cast<time_t>(iNanoseconds / 1000000000);
-    moment.tv_nsec = static_cast<long>(iNanoseconds % 1000000000);
-    return moment;
+/// Waits until `cond` is signalled. Returns false when the moment came first.
+bool wait_until(pthread_cond_t& cond, int64_t iMoment) {
+    const timespec moment{static_cast<time_t>(iMoment / 1'000'000'000),
+                          static_cast<long>(iMoment % 1'000'000'000)};
+    return pthread_cond_clockwait(&cond, &thrd_pool_mutex, CLOCK_MONOTONIC, &moment) == 0;
 }
 
-/// Waits until `cond` is signalled. Returns false when `moment` came first.
-bool wait_until(pthread_cond_t& cond, const timespec& moment) {
-    return pthread_cond_clockwait(&cond, &thrd_pool_mutex, CLOCK_MONOTONIC, &moment) == 0;
+/// Sleeps until there may be something to take.
+void wait_for_news() {
+    int64_t iUntil = INT64_MAX;
+    if (uTimedTasks != 0)
+        iUntil = pTimedTasks[0].iMoment;
+    if (a_task_waits())
+        iUntil = std::min(iUntil, pool_now() + LOOKOUT_INTERVAL_NS);
+    if (iUntil == INT64_MAX || (iLookoutUntil != 0 && iLookoutUntil <= iUntil)) {
+        pthread_cond_wait(&newsCond, &thrd_pool_mutex);
+        return;
+    }
+    iLookoutUntil = iUntil;
+    wait_until(newsCond, iUntil);
+    if (iLookoutUntil == iUntil) // else somebody looks out for an earlier moment
+        iLookoutUntil = 0;
 }
 
 // --------------------------------------------------------------- the threads
 
-/// Takes the next task into *ppTask. Returns 1 when there was one, 0 when the
-/// queue is empty, -1 when the pool is closed.
+/// Takes the next task into *ppTask, when one has come. Returns 1, or -1 when the
+/// pool is closed.
 int threadWaitForNextTask(thrd_task** ppTask) {
     const mutex_guard lock(thrd_pool_mutex);
     *ppTask = nullptr;
-    if (is_closed())
-        return -1;
-    if (task_queue->pFirstTask == nullptr)
-        return 0;
-    *ppTask = take_first_task();
-    --totalFreeThrdsInPool;
-    if (!bLookoutPosted)
-        pthread_cond_signal(&newsCond);
-    return 1;
+    for (bool bWaited = false; !is_closed(); bWaited = true) {
+        queue_due_tasks();
+        const bool bEnoughAtWork = totalThrdsInPool - totalFreeThrdsInPool >= uProcessors;
+        if (a_task_waits() && (bWaited || !bEnoughAtWork)) {
+            *ppTask = take_first_task();
+            (*ppTask)->bOnThread = true;
+            --totalFreeThrdsInPool;
+            wake_thread_for_task();
+            return 1;
+        }
+        wait_for_news();
+    }
+    return -1;
 }
 
-/// Sleeps until there may be something to do: at most `iInterval` microseconds
-/// for the thread that becomes the lookout.
-void wait_for_news(int64_t iInterval) {
-    const mutex_guard lock(thrd_pool_mutex);
-    if (is_closed() || task_queue->pFirstTask != nullptr)
-        return;
-    if (bLookoutPosted) {
-        pthread_cond_wait(&newsCond, &thrd_pool_mutex);
-        return;
-    }
-    bLookoutPosted = true;
-    wait_until(newsCond, after(iInterval));
-    bLookoutPosted = false;
-}
-
-void run_task(thrd_task* pTask, pthread_t self) {
-    {
-        const std::unique_ptr<thrd_task> task(pTask);
-        task->pServiceThrdId->store(self);
-        pool_task_main(task->pTask);
-        task->pServiceThrdId->store(0);
-    }
-    const mutex_guard lock(thrd_pool_mutex);
+/// Does as the task wishes. Mutex held.
+void leave_thread(thrd_task* pTask, const task_wish& wish) {
+    pTask->bOnThread = false;
     ++totalFreeThrdsInPool;
+    if (wish.kind == task_wish::ENDED || is_closed()) {
+        forget_task(pTask);
+    } else if (wish.kind == task_wish::LATER && wish.iMoment != 0) {
+        add_timed_task({wish.iMoment, pTask});
+    } else if (wish.kind == task_wish::LATER || pTask->bResumed) {
+        pTask->bResumed = false;
+        append_task(pTask);
+    }
+}
+
+void run_step(thrd_task* pTask, pthread_t self) {
+    pTask->pServiceThrdId->store(self);
+    const task_wish wish = pool_task_main(pTask->pTask);
+    pTask->pServiceThrdId->store(0);
+    const mutex_guard lock(thrd_pool_mutex);
+    leave_thread(pTask, wish);
 }
 
 void leave_pool() {
@@ -179,21 +259,11 @@ void* pool_thread(void*) {
     // A thread that is cancelled halfway would keep its counts, perhaps a mutex.
     pthread_setcancelstate(PTHREAD_CANCEL_DISABLE, nullptr);
     const pthread_t self = pthread_self();
-    int64_t iInterval = IDLE_INTERVAL;
-    thrd_task* pTask;
-    for (int iAnswer; (iAnswer = threadWaitForNextTask(&pTask)) != -1;) {
-        if (iAnswer == 1) {
-            run_task(pTask, self);
-            iInterval = IDLE_INTERVAL;
-        } else {
-            wait_for_news(iInterval);
-            iInterval = std::min(2 * iInterval, LONGEST_IDLE_INTERVAL);
-        }
-    }
+    for (thrd_task* pTask; threadWaitForNextTask(&pTask) != -1;)
+        run_step(pTask, self);
     leave_pool();
     return nullptr;
 }
-
 // -------------------------------------------------------------------- growth
 
 /// Blocks or unblocks the asynchronous signals in the calling thread. Returns 0,
@@ -258,32 +328,57 @@ int addThreadsToPool(int iCount) {
 
 } // namespace
 
+int64_t pool_now() {
+    timespec now;
+    clock_gettime(CLOCK_MONOTONIC, &now);
+    return int64_t{now.tv_sec} * 1'000'000'000 + now.tv_nsec;
+}
+
 int startNewThreadPool() {
+    cpu_set_t processors;
+    if (sched_getaffinity(0, sizeof processors, &processors) == 0)
+        uProcessors = static_cast<uint32_t>(CPU_COUNT(&processors));
     return addThreadsToPool(THREADS_AT_START);
 }
 
-int poolAddNewTask(std::atomic<pthread_t>* pServiceThrdId, void* pTask) {
+int poolAddNewTask(std::atomic<pthread_t>* pServiceThrdId, void* pTask, thrd_task** ppTask) {
     if (!enough_threads_are_free() && addThreadsToPool(THREADS_PER_GROWTH) == -1)
         return -1;
-    std::unique_ptr<thrd_task> task(new (std::nothrow) thrd_task{nullptr, pTask, pServiceThrdId});
-    if (task == nullptr) {
+    std::unique_ptr<thrd_task> task(new (std::nothrow)
+                                        thrd_task{nullptr, pTask, pServiceThrdId, false, false});
+    const mutex_guard lock(thrd_pool_mutex);
+    if (task == nullptr || !reserve_timed_task()) {
         warn_insufficient_resources_during_open("malloc()", sizeof(thrd_task));
         return -1;
     }
-    const mutex_guard lock(thrd_pool_mutex);
     if (is_closed())
         return -1;
+    ++uTasks;
+    if (ppTask != nullptr)
+        *ppTask = task.get();
     append_task(task.release());
-    pthread_cond_signal(&newsCond);
+    wake_thread_for_task();
     return 0;
+}
+
+void poolResumeTask(thrd_task* pTask) {
+    const mutex_guard lock(thrd_pool_mutex);
+    if (is_closed())
+        return;
+    if (pTask->bOnThread) {
+        pTask->bResumed = true;
+        return;
+    }
+    append_task(pTask);
+    wake_thread_for_task();
 }
 
 bool endThrdPool() {
     const mutex_guard lock(thrd_pool_mutex);
     if (!is_closed())
         close_pool();
-    const timespec moment = after(CLOSE_ATTEMPTS * CLOSE_INTERVAL);
-    while (totalThrdsInPool != 0 && wait_until(emptyCond, moment)) {
+    const int64_t iMoment = pool_now() + CLOSE_WAIT_NS;
+    while (totalThrdsInPool != 0 && wait_until(emptyCond, iMoment)) {
     }
     return totalThrdsInPool == 0;
 }

@@ -6,12 +6,8 @@
 #include "walk.h"
 
 #include <algorithm>
-#include <unistd.h>
 
 namespace {
-
-constexpr int TAIL_WAITS = 5;
-constexpr useconds_t TAIL_WAIT_US = 10'000;
 
 /// A walk over the ring that ends after one turn whatever the lengths are.
 struct ring_search {
@@ -67,11 +63,10 @@ cu_timeinfo time_base(const trace_file* pTraceFile, uint64_t uOffset,
 
 void request_tail(trace_file* pTraceFile) {
     store_tail_request(pTraceFile->pHeader, TRC_TAIL_REQUESTED);
-    for (int i = 0; i < TAIL_WAITS; ++i) {
-        usleep(TAIL_WAIT_US);
-        if (tail_request_is_acknowledged(pTraceFile->pHeader))
-            return;
-    }
+}
+
+bool tail_is_kept(const trace_file* pTraceFile) {
+    return tail_request_is_acknowledged(pTraceFile->pHeader);
 }
 
 void release_tail(trace_file* pTraceFile) {

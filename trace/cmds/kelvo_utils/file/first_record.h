@@ -8,9 +8,11 @@
 
 #include "kelvo.h"
 
-/// Raises uTailReq and waits, at most five times 10 milliseconds, for the
-/// writer to acknowledge it.
+/// Raises uTailReq: asks the writer to leave the oldest record where it is.
 void request_tail(trace_file* pTraceFile);
+
+/// Whether the writer has acknowledged it.
+bool tail_is_kept(const trace_file* pTraceFile);
 
 /// Lowers uTailReq: the writer may give up old records again.
 void release_tail(trace_file* pTraceFile);

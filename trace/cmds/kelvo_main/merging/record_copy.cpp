@@ -1,23 +1,19 @@
 #include "record_copy.h"
 
-#include "insufficient.h"
 #include "walk.h"
 
-#include <cstdlib>
 #include <cstring>
 
+trace_bytes record_at_reader(const trace_file* pTraceFile, const trace_record_header& header) {
+    return record_bytes(pTraceFile, pTraceFile->pCurRec, header.length);
+}
+
 trace_queue_element* copy_record(trace_file* pTraceFile, const trace_record_header& header,
-                                 element_memory* pMemory) {
-    const trace_bytes record = record_bytes(pTraceFile, pTraceFile->pCurRec, header.length);
-    const size_t uSize = record.size() + QUEUE_ELEMENT_OVERHEAD;
-    auto* const pElement = static_cast<trace_queue_element*>(
-        pMemory != nullptr ? pMemory->allocate(uSize) : malloc(uSize));
-    if (pElement == nullptr) {
-        warn_insufficient_resources(pTraceFile->pName, static_cast<int64_t>(uSize));
-        return nullptr;
-    }
+                                 trace_bytes record, void* pRoom) {
     constexpr size_t HEAD = offsetof(trace_queue_element, header);
-    auto* const pBytes = reinterpret_cast<std::byte*>(pElement);
+    const size_t uSize = record.size() + QUEUE_ELEMENT_OVERHEAD;
+    auto* const pElement = static_cast<trace_queue_element*>(pRoom);
+    auto* const pBytes = static_cast<std::byte*>(pRoom);
     memset(pBytes, 0, HEAD);
     memcpy(pBytes + HEAD, record.data(), record.size());
     memset(pBytes + HEAD + record.size(), 0, uSize - HEAD - record.size());
