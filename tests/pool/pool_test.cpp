@@ -201,6 +201,7 @@ task_wish step(void* pTask) {
         ++iEnded;
     else if (wish.kind == task_wish::SUSPENDED)
         poolResumeTask(self.pPoolTask); // sooner than it can have left the thread
+    poolWakeThread(1);
     return wish;
 }
 

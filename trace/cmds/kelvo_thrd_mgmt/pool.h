@@ -48,8 +48,12 @@ int poolAddNewTask(std::atomic<pthread_t>* pServiceThrdId, void* pTask,
 
 /// Queues a suspended task for its next step; also one that is only just about
 /// to leave its thread with that wish. Once for each time that a task is
-/// suspended. Any thread.
+/// suspended; poolWakeThread must follow. Any thread.
 void poolResumeTask(thrd_task* pTask);
+
+/// Has a thread begin with the tasks that wait, when there are `uLeast` of them or
+/// more; fewer are begun within some 1.5 milliseconds. Any thread.
+void poolWakeThread(uint32_t uLeast);
 
 /// Closes the pool: frees the tasks that wait for a step and waits, about 100
 /// milliseconds at most, for its threads to end. Harmless when the pool was

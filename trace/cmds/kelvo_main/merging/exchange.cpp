@@ -14,7 +14,7 @@ TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;
 
 /// What all files together may have queued beyond the cap, in even shares: enough
 /// that a merge of many files moves in runs.
-constexpr uint32_t FLOORS_TOGETHER = 65'536;
+constexpr uint32_t FLOORS_TOGETHER = 131'072;
 constexpr uint64_t FLOOR_BYTES_TOGETHER = 64ULL << 20;
 constexpr uint32_t MOST_FLOOR = 1024;
 constexpr uint32_t LEAST_FLOOR = 5;
@@ -26,6 +26,9 @@ constexpr uint64_t SCARCE_BYTES = 320ULL << 20;
 /// The queue is no longer full for so long before everybody is let on: else readers
 /// would come and go for a few records each.
 constexpr int64_t FULL_QUEUE_WAIT_NS = 500'000;
+
+/// A pool thread is woken for so many files' part of the readers at a time.
+constexpr uint32_t FILES_PER_WAKING = 16;
 
 // Under priorityQmutex:
 uint32_t uRunningFiles = 0;
@@ -211,6 +214,7 @@ void exchange_with_readers(uint32_t uTaken) {
     const batch_list finished = TrcOutput_Q.finished;
     TrcOutput_Q.finished = {};
     resumptions resumed;
+    uint32_t uRunning;
     {
         const mutex_guard guard(ctrl.priorityQmutex);
         ctrl.queueDepth -= uTaken;
@@ -219,7 +223,10 @@ void exchange_with_readers(uint32_t uTaken) {
             settle(*pBatch, resumed);
         end_holding_back(resumed);
         take_over_pushed();
+        uRunning = uRunningFiles;
     }
     release_batches(finished);
     resumed.carry_out();
+    // Who has taken something has more, mostly, and the readers may come in company.
+    poolWakeThread(uTaken == 0 ? 1 : uRunning / FILES_PER_WAKING + 1);
 }

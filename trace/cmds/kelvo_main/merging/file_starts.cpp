@@ -8,6 +8,7 @@
 #include "pool.h"
 
 #include <algorithm>
+#include <atomic>
 #include <memory>
 #include <new>
 #include <span>
@@ -24,6 +25,7 @@ constexpr uint32_t NO_FILE = UINT32_MAX;
 
 std::unique_ptr<merge_file[]> mergeFiles; ///< in the order in which they are started
 uint32_t uStartedFiles = 0;
+std::atomic<bool> bStarting{false};
 
 bool its_time_has_come(const TrcPreProcHdrElem& candidate, const record_batch& batch) {
     return batch.uLastStamp >= candidate.header.timeStamp ||
@@ -123,7 +125,8 @@ void TrcFileProcessingCtrl(const record_batch* pBatch, uint32_t next) {
         TrcPreProcHdrElem& candidate = ctrl.pTrcPreProcHdrList[ctrl.uNextUnOpenFileIdx];
         const bool bItsTurn = pBatch != nullptr && its_time_has_come(candidate, *pBatch);
         if (!bItsTurn && !may_run_ahead(pBatch == nullptr ? next : NO_FILE))
-            return;
+            break;
+        bStarting.store(true, std::memory_order_relaxed);
         candidate.isOpenned = 1;
         if (start_tracefile_processing(candidate.pTrcFile, &candidate) != 0) {
             candidate.isOpenned = 0;
@@ -131,4 +134,9 @@ void TrcFileProcessingCtrl(const record_batch* pBatch, uint32_t next) {
         }
         ++ctrl.uNextUnOpenFileIdx;
     }
+    bStarting.store(false, std::memory_order_relaxed);
+}
+
+bool files_are_being_started() {
+    return bStarting.load(std::memory_order_relaxed);
 }

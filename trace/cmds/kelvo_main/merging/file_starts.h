@@ -43,6 +43,9 @@ int start_tracefile_processing(trace_file* pTraceFile, const TrcPreProcHdrElem* 
 /// priorityQmutex held.
 void TrcFileProcessingCtrl(const record_batch* pBatch, uint32_t next);
 
+/// Whether a thread is in the middle of that. Any thread, no lock.
+bool files_are_being_started();
+
 /// The first of these, when there is any file left to start.
 inline void start_files_before(const record_batch& batch) {
     const TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;

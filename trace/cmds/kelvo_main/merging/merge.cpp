@@ -6,6 +6,7 @@
 #include "pool.h"
 
 #include <algorithm>
+#include <sched.h>
 
 namespace {
 
@@ -61,10 +62,13 @@ public:
     }
 
 private:
-    /// A moment without sleeping, over when something comes.
+    /// A moment in which the readers work undisturbed: who looks all the time takes
+    /// a few records at once from where they are just being written, at half the
+    /// speed.
     static void look_out() {
+        sched_yield();
         const int64_t iUntil = pool_now() + LOOK_INTERVAL_NS;
-        while (!something_was_pushed() && pool_now() < iUntil)
+        while (pool_now() < iUntil)
             pause_processor();
     }
 

@@ -13,8 +13,6 @@ void fetch(const trace_queue_element* pElement) {
     const auto* const pBytes = reinterpret_cast<const char*>(pElement);
     __builtin_prefetch(pBytes); // a hint: nothing is read
     __builtin_prefetch(pBytes + LINE);
-    __builtin_prefetch(pBytes + 6 * LINE);
-    __builtin_prefetch(pBytes + 7 * LINE);
 }
 
 // ----------------------------------------------------------------- late runs
@@ -151,10 +149,12 @@ void output_queue::file_ends(merge_file& file) {
 /// Finds the file's earliest record and gives the file its place among the others.
 void output_queue::find_head(merge_file& file) {
     file_run& run = file.run;
+    run.pHeadBatch = run.inOrder.pFirst;
     file_heap::entry earliest{};
-    run.pHeadBatch = nullptr;
-    for (record_batch* const pBatch : {run.inOrder.pFirst, run.pLate, run.pOwnBase}) {
-        if (pBatch == nullptr)
+    if (run.pHeadBatch != nullptr)
+        earliest = entry_of(*run.pHeadBatch);
+    for (record_batch* const pBatch : {run.pLate, run.pOwnBase}) {
+        if (pBatch == nullptr) [[likely]]
             continue;
         const file_heap::entry entry = entry_of(*pBatch);
         if (run.pHeadBatch != nullptr && !is_later(earliest, entry))

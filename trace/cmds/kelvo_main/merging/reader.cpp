@@ -27,6 +27,10 @@ constexpr int NUMBER_WAITS = 500; // a writer that was killed stores no number a
 constexpr int64_t FOLLOW_WAIT_NS = 100 * MS;
 constexpr int64_t FOLLOW_MOMENTS_NS = 20 * MS;
 
+/// While somebody starts a row of files, under the lock that every step needs sooner
+/// or later, no other step begins: it would only keep its thread.
+constexpr int64_t START_WAIT_NS = MS;
+
 /// A step ends after so many records in any case, so that others have their turn.
 constexpr uint32_t MOST_IN_A_STEP = 65'536;
 
@@ -46,6 +50,8 @@ public:
         : m_file(file), m_pTraceFile(file.pFile), m_state(file.reader), m_records(&file) {}
 
     task_wish run() {
+        if (files_are_being_started() && m_state.phase != reader_phase::BEGINS)
+            return {task_wish::LATER, pool_now() + START_WAIT_NS};
         switch (m_state.phase) {
         case reader_phase::BEGINS:
             return begin();
