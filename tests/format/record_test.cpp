@@ -225,6 +225,16 @@ byte_vector error_body(uint32_t uTraceId, const std::string& ffdcId,
                      ffdcId, '\0', defaultText);
 }
 
+TEST_F(record_test, refused_template_is_read_for_a_data_record_and_for_each_block) {
+    std::ofstream(directory.file("BAD_.tpl")) << "1 \"%q\"\n";
+    CaptureStderr();
+    format(TRC_FUNC_DATA, raw_bytes(1U, 2U, block("Z"), block("")), "BAD_");
+    std::string messages;
+    for (int i = 0; i < 3; i++)
+        messages += "kelvo: 2625-120 Format error on line 1. Invalid data type q specified.\n\n";
+    EXPECT_EQ(GetCapturedStderr(), messages);
+}
+
 TEST_F(record_test, error_records) {
     const std::string plain =
         " id=0x00000030Error -2 was returned from \"open\" on line 12 in file \"a.c\".\n";

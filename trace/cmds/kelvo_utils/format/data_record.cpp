@@ -6,7 +6,6 @@
 #include "hex.h"
 #include "record_bodies.h"
 #include "record_text.h"
-#include "store.h"
 
 namespace {
 
@@ -55,15 +54,10 @@ int format_data_record(const record_view& record) {
     if (anchor.bBrief)
         return 0;
 
-    // A refused template file is read again by every record, not by every block:
-    // a record may have very many.
-    const bool bAskForBlocks = template_is_loaded(record.pElement->header.compId);
     trace_bytes data;
     for (uint32_t i = uFirstFree; i < uBlocks && take_data_block(&blocks, &data); i++) {
-        pFormat = nullptr;
-        if (bAskForBlocks)
-            pFormat = find_record_format(record, record.uTraceId, static_cast<int>(i),
-                                         &insufficient_resources);
+        pFormat = find_record_format(record, record.uTraceId, static_cast<int>(i),
+                                     &insufficient_resources);
         if (insufficient_resources)
             return 1;
         if (pFormat)
