@@ -121,8 +121,12 @@ TEST(parms, packed_parameters_print_in_their_places) {
         {"%1$f %1$p %1$r %1$T %1$z %1$d", raw_bytes(i), "%1$f %1$p %1$r %1$T %1$z 7"},
         {"%2$*1$z|%1$d", raw_bytes(i), "|7"}, // the rest is nothing, at any width
         {"%1$d %1$f", raw_bytes(0.5), "%1$d 0.500000"},
-        {"%1$d %1$hx %1$lld", raw_bytes(INT64_MIN),
-         "-9223372036854775808 8000000000000000 -9223372036854775808"},
+        // It is printed as wide as each place asks for, whatever it holds.
+        {"%1$hd %1$d", raw_bytes(70'000), "4464 70000"},
+        {"%1$d %1$hx %1$Ld %1$lld", raw_bytes(-0x6789ABCDEFLL),
+         "1985229329 3211 1985229329 -444691369455"},
+        {"%1$llx %1$o %1$ld %1$hd", raw_bytes(int16_t{-2}), "fffffffffffffffe 37777777776 -2 -2"},
+        {"%1$lx %1$d %1$u", raw_bytes(-1), "ffffffff -1 4294967295", 0, 0},
         {"%2$*1$d %1$s", raw_bytes("\5\0\0\0"sv, i), "    7 \5"},
         // 39 characters of a rebuilt text are the most.
         {"%" + std::string(37, '0') + "d", raw_bytes(i), "7"},

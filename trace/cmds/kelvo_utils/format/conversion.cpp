@@ -96,15 +96,11 @@ public:
         pConversion->iPrecision = iStarPrecision;
     }
 
-    void take_modifier(parm_type_t type) {
-        const auto base = static_cast<parm_type_t>(type & PARM_BASE_MASK);
-        const bool bInteger = std::string_view("diouxX").find(text.back()) != text.npos;
-        const bool bLong = base == PARM_LONG || base == PARM_LONGLONG;
-        for (; uPosition + 1 < text.size(); uPosition++) {
-            if (bInteger && peek() == 'h' && base == PARM_SHORT)
-                pConversion->bShort = true;
-            else if (!bInteger || peek() != 'l' || !bLong)
-                continue;
+    void take_modifier() {
+        if (std::string_view("diouxX").find(text.back()) == text.npos)
+            return;
+        for (; peek() == 'h' || peek() == 'l'; uPosition++) {
+            pConversion->uBits = peek() == 'h' ? 16 : 64;
             pConversion->iRebuiltLength++;
         }
     }
@@ -181,8 +177,8 @@ constexpr uint8_t classesOfType[PARM_BASE_MASK + 1] = {
 
 } // namespace
 
-conversion parse_conversion(std::string_view text, bool bNumbered, parm_type_t type,
-                            int32_t iStarWidth, int32_t iStarPrecision) {
+conversion parse_conversion(std::string_view text, bool bNumbered, int32_t iStarWidth,
+                            int32_t iStarPrecision) {
     conversion result;
     if (text.size() < 2)
         return result;
@@ -195,7 +191,7 @@ conversion parse_conversion(std::string_view text, bool bNumbered, parm_type_t t
     parser.take_flags();
     parser.take_width(iStarWidth);
     parser.take_precision(iStarPrecision);
-    parser.take_modifier(type);
+    parser.take_modifier();
     return result;
 }
 

@@ -23,22 +23,22 @@ struct conversion {
     int64_t iPrecision = -1; ///< -1: none; not bounded either
     int iRebuiltLength = 2;  ///< characters of the rebuilt text, '%' and letter included
     uint8_t uFlags = 0;      ///< CONVERSION_* bits
-    bool bShort = false;     ///< the "h" of a 16-bit integer
+    uint8_t uBits = 32;      ///< of an integer that its modifier asks for: 16, 32 or 64
     char letter = '\0';      ///< never 'C' or 'S': those are 'c' and 's'
 };
 
 /// Longest rebuilt text that is used.
 inline constexpr int MAX_REBUILT_CONVERSION = 39;
 
-/// Takes the conversion `text`, from its '%' through its letter, apart for a
-/// parameter of type `type`. `bNumbered`: the string has numbered parameters.
-/// The values stand in for a '*' width and a '*' precision.
+/// Takes the conversion `text`, from its '%' through its letter, apart.
+/// `bNumbered`: the string has numbered parameters. The values stand in for a '*'
+/// width and a '*' precision.
 ///
 /// Left out are the flags "B", "N" and "J", which printf does not know, a
-/// length modifier that does not go with the type, and a negative '*'
-/// precision; a negative '*' width is the flag "-" and its magnitude.
-conversion parse_conversion(std::string_view text, bool bNumbered, parm_type_t type,
-                            int32_t iStarWidth, int32_t iStarPrecision);
+/// length modifier that printf would not take as it is meant here, and a negative
+/// '*' precision; a negative '*' width is the flag "-" and its magnitude.
+conversion parse_conversion(std::string_view text, bool bNumbered, int32_t iStarWidth,
+                            int32_t iStarPrecision);
 
 /// Whether printf's `letter` can print a value of type `type`. Always so in a
 /// string without numbered parameters.

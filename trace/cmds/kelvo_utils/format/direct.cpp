@@ -11,12 +11,12 @@ bool is_integer(parm_type_t base) {
     return base == PARM_SHORT || base == PARM_INT || base == PARM_LONG || base == PARM_LONGLONG;
 }
 
-/// The writer of an integer, when the letter says of the sign what the type
-/// says: with numbered parameters it may not.
+/// The writer of an integer, when the conversion says of its sign and size what
+/// the type says: with numbered parameters it may not.
 direct_writer integer_writer(const conversion& conv, parm_type_t type) {
     const bool bUnsigned = type & PARM_UNSIGNED;
-    const bool bShort = (type & PARM_BASE_MASK) == PARM_SHORT;
-    if (conv.bShort != bShort)
+    const parm_type_t base = base_type(type);
+    if (conv.uBits != (base == PARM_SHORT ? 16 : base == PARM_INT ? 32 : 64))
         return DIRECT_NONE;
     switch (conv.letter) {
     case 'd':
@@ -75,7 +75,7 @@ void settle_direct_writer(const format_entry& entry, size_t uConv) {
     const parm_type_t type = entry.pParmTypes[place.parmNum];
     const std::string_view text(entry.pString + place.offset, place.lenConv);
     choose_direct_writer(
-        piece, parse_conversion(text, entry.properties & FORMAT_NUMBERED_PARMS, type, 0, 0), type);
+        piece, parse_conversion(text, entry.properties & FORMAT_NUMBERED_PARMS, 0, 0), type);
 }
 
 char* put_before_digits(char* pOut, const format_piece& piece, bool bNegative, int iDigits) {

@@ -166,8 +166,8 @@ void write_number(text_run& out, const conversion& conv, int64_t iValue) {
 
 } // namespace
 
-void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits) {
-    const int64_t iValue = narrow(uValue, iBits, is_signed(conv.letter));
+void write_integer(text_run& out, const conversion& conv, uint64_t uValue) {
+    const int64_t iValue = narrow(uValue, conv.uBits, is_signed(conv.letter));
     if (conv.letter == 'p')
         write_by_printf(out, conv, "", reinterpret_cast<void*>(static_cast<uintptr_t>(uValue)));
     else if (conv.uFlags & CONVERSION_GROUP)

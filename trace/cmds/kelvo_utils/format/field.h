@@ -16,9 +16,9 @@
 /// Characters kept of one field, as of one text of output_printf.
 inline constexpr size_t MAX_FIELD_TEXT = BOUNDED_PRINTF_SIZE - 1;
 
-/// An integer by "diouxXp". `uValue` holds it in its lowest `iBits` bits (16,
-/// 32 or 64); the letter says whether they are signed.
-void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits);
+/// An integer by "diouxXp". Of `uValue` as many bits count as the conversion asks
+/// for, all of them with "p"; the letter says whether they are signed.
+void write_integer(text_run& out, const conversion& conv, uint64_t uValue);
 
 /// A floating-point number by "eEfgG".
 void write_real(text_run& out, const conversion& conv, double value);

@@ -78,7 +78,6 @@ void write_value(text_run& out, const conversion& conv, parm_type_t type, const 
                  int bAddr64) {
     const bool bUnsigned = type & PARM_UNSIGNED;
     uint64_t uInteger = 0;
-    int iBits = conv.bShort ? 16 : 32;
     switch (base_type(type)) {
     case PARM_CHAR:
         uInteger = load<uint8_t>(parm.bytes, 0);
@@ -89,10 +88,12 @@ void write_value(text_run& out, const conversion& conv, parm_type_t type, const 
         break;
     }
     case PARM_INT:
-        uInteger = load<uint32_t>(parm.bytes, 0);
+        if (bUnsigned)
+            uInteger = load<uint32_t>(parm.bytes, 0);
+        else
+            uInteger = static_cast<uint64_t>(load<int32_t>(parm.bytes, 0));
         break;
     case PARM_LONG:
-        iBits = 64;
         if (bAddr64)
             uInteger = load<uint64_t>(parm.bytes, 0);
         else if (bUnsigned)
@@ -101,7 +102,6 @@ void write_value(text_run& out, const conversion& conv, parm_type_t type, const 
             uInteger = static_cast<uint64_t>(load<int32_t>(parm.bytes, 0));
         break;
     case PARM_LONGLONG:
-        iBits = 64;
         uInteger = load<uint64_t>(parm.bytes, 0);
         break;
     case PARM_DOUBLE:
@@ -124,7 +124,7 @@ void write_value(text_run& out, const conversion& conv, parm_type_t type, const 
         const char ch = static_cast<char>(uInteger);
         write_string(out, conv, {&ch, 1});
     } else {
-        write_integer(out, conv, uInteger, iBits);
+        write_integer(out, conv, uInteger);
     }
 }
 
@@ -154,7 +154,7 @@ void write_by_text(format_run& run, const conv_spec& place, const parm_ref& parm
 
     const std::string_view text = run.text_of(place);
     const conversion conv =
-        parse_conversion(text, entry.properties & FORMAT_NUMBERED_PARMS, type,
+        parse_conversion(text, entry.properties & FORMAT_NUMBERED_PARMS,
                          run.star_value(place.widthParmNum), run.star_value(place.precParmNum));
     if (conv.iRebuiltLength > MAX_REBUILT_CONVERSION || !conversion_fits(conv.letter, type))
         run.out.add(text);
