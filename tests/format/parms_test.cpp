@@ -250,8 +250,12 @@ TEST(parms, huge_widths_and_precisions_keep_what_is_shown) {
         {"%2000000000.1999999990f", raw_bytes(0.5), "        0.5" + zeros.substr(11)},
         {"%.2147483647s", raw_bytes("ab\0"sv), "ab"},
         {"%2000000000p", raw_bytes(int64_t{16}), blanks},
+        {"%.2147483645p", raw_bytes(int64_t{16}), "0x" + zeros.substr(2)},
+        {"%.2147483646p", raw_bytes(int64_t{16}), replacement},
+        {"%.2147483647p|%.2147483646p", raw_bytes(int64_t{0}, int64_t{0}), "(nil)|(nil)"},
         {"%2147483648d", raw_bytes(5), replacement},
         {"%99999999999999999999f", raw_bytes(0.5), replacement},
+        {"%.2147483648g", raw_bytes(0.5), replacement},
         {"%.2147483648s", raw_bytes("ab\0"sv), replacement},
         {"%*d", raw_bytes(5, INT_MIN), replacement},
         {"%*f", raw_bytes(0.5, INT_MIN), replacement},
@@ -271,8 +275,9 @@ packed_case make_conversion(std::mt19937_64& random) {
     std::string flags;
     for (int i = one_of(random, {0, 0, 1, 1, 2, 3}); i > 0; i--)
         flags += one_of(random, {'-', '+', ' ', '#', '0', '\'', 'B'});
-    const int iWidth = one_of(random, {0, 0, 1, 5, 12, 30, 4090, 4095, 4096, 5000, -7, -5000});
-    const int iPrecision = one_of(random, {-1, -1, -1, 0, 1, 5, 20, 300, 4000, 4096, 5000});
+    const int iWidth =
+        one_of(random, {0, 0, 1, 5, 12, 30, 4090, 4095, 4096, 5000, 10000, -7, -5000});
+    const int iPrecision = one_of(random, {-1, -1, -1, 0, 1, 5, 20, 300, 4000, 4096, 5197, 6000});
     const std::string modifier = one_of(random, {"", "h", "l", "ll", "L"});
     const std::string_view letters = "ddiuxXocsfeEgGp";
     const char letter = letters[random() % letters.size()];
