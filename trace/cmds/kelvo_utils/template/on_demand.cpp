@@ -27,9 +27,11 @@ int read_first_on_path(template_file* pTemplate, int* p_insufficient_resources) 
         file_name_text name;
         if (!build_template_file_name(directory, pTemplate->compId, &name))
             continue;
-        const file_owner pFile = open_template_file(name.text);
-        if (pFile != nullptr)
-            return read_template(pTemplate, name.text, pFile.get(), p_insufficient_resources);
+        file_owner pFile;
+        if (open_template_file(name.text, &pFile))
+            return pFile == nullptr
+                       ? 0
+                       : read_template(pTemplate, name.text, pFile.get(), p_insufficient_resources);
     }
     return 0;
 }

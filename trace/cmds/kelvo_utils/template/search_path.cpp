@@ -91,16 +91,14 @@ bool build_template_file_name(std::string_view directory, const char* compId,
     return pName->append_slash() && pName->append(component) && pName->append(TEMPLATE_SUFFIX);
 }
 
-file_owner open_template_file(const char* pFileName) {
+bool open_template_file(const char* pFileName, file_owner* pFile) {
     const int fd = open(pFileName, O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
     if (fd < 0)
-        return nullptr;
+        return false;
     struct stat status;
-    FILE* pFile = nullptr;
-    if (fstat(fd, &status) == 0 && S_ISREG(status.st_mode) &&
-        status.st_size <= MAX_TEMPLATE_FILE_SIZE)
-        pFile = fdopen(fd, "r");
-    if (pFile == nullptr)
+    const bool bRegular = fstat(fd, &status) == 0 && S_ISREG(status.st_mode);
+    pFile->reset(bRegular ? fdopen(fd, "r") : nullptr);
+    if (*pFile == nullptr)
         close(fd);
-    return file_owner(pFile);
+    return *pFile != nullptr || !bRegular;
 }

@@ -6,7 +6,6 @@
 #include <cstdio>
 #include <memory>
 #include <string_view>
-#include <sys/types.h>
 
 /// Room for the name of a template file, with its NUL.
 inline constexpr size_t FILE_NAME_ROOM = 4096;
@@ -44,10 +43,7 @@ bool take_last_directory(std::string_view* pPath, std::string_view* pDirectory);
 bool build_template_file_name(std::string_view directory, const char* compId,
                               file_name_text* pName);
 
-/// A larger file is no template file: reading it would only hold the run up.
-inline constexpr off_t MAX_TEMPLATE_FILE_SIZE = off_t{256} * 1024 * 1024;
-
-/// Opens a template file for reading; null when it cannot be opened, is not a
-/// regular file (opening a FIFO or a device must not hang the run) or is larger
-/// than MAX_TEMPLATE_FILE_SIZE.
-file_owner open_template_file(const char* pFileName);
+/// Opens a template file for reading. Returns false when it cannot be opened;
+/// `*pFile` is null, too, when it is no regular file: it has no entries then, since
+/// reading a FIFO or a device could hang the run.
+bool open_template_file(const char* pFileName, file_owner* pFile);
