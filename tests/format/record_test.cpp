@@ -82,6 +82,7 @@ constexpr char templateText[] = R"(
 0x0b ">>enter"
 0x0c "at %d 100%%\n"
 0x0d "[%T]"
+0x0e "%1$d %2$s %3$d %4$d"
 )";
 
 class record_test : public testing::Test {
@@ -247,9 +248,13 @@ TEST_F(record_test, error_records) {
     // The default text runs to the end of the record without a NUL.
     EXPECT_EQ(text_of(0x30, "ff-1", "disk %s: %d"),
               plain + "    Message=disk sda1: 28\n    FFDCID=\"ff-1\"\n");
-    EXPECT_EQ(text_of(0x30, "", longText), plain + "    Message=" + longText + "\n");
+    // 4095 characters of each text are kept.
+    EXPECT_EQ(text_of(0x30, longText, longText), plain + "    Message=" + std::string(4084, 'm') +
+                                                     "\n    FFDCID=\"" + std::string(4084, 'm') +
+                                                     "\n");
     EXPECT_EQ(text_of(10, "ff-1", "disk %s: %d"), " error -2 open 12 a.c (disk sda1: 28) <ff-1>\n");
     EXPECT_EQ(text_of(10, "", ""), " error -2 open 12 a.c () <>\n");
+    EXPECT_EQ(text_of(14, "", ""), " -2 open 12 6499937\n"); // "a.c" with its NUL
 }
 
 TEST_F(record_test, error_records_with_false_offsets_and_counts) {

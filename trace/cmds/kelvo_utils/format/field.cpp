@@ -28,28 +28,6 @@ int64_t size_of(std::string_view text) {
     return static_cast<int64_t>(text.size());
 }
 
-/// A text of which only the first MAX_PRINTED_TEXT characters go out.
-class kept_text {
-public:
-    explicit kept_text(text_run& run) : out(run) {}
-
-    void add(std::string_view piece) {
-        piece = piece.substr(0, uLeft);
-        out.add(piece);
-        uLeft -= piece.size();
-    }
-
-    void fill(char ch, int64_t iCount) {
-        const size_t uCount = std::min(static_cast<size_t>(iCount), uLeft);
-        out.fill(ch, uCount);
-        uLeft -= uCount;
-    }
-
-private:
-    text_run& out;
-    size_t uLeft = MAX_PRINTED_TEXT;
-};
-
 /// printf refuses a width or precision that an int does not hold.
 bool is_refused(const conversion& conv) {
     return conv.iWidth > INT_MAX || conv.iPrecision > INT_MAX;
