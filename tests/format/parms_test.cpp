@@ -49,7 +49,7 @@ std::string output_of(const std::function<void()>& writes) {
 /// What format_packed_parms does in one go in two steps, the second of which data
 /// records share.
 void write_listed(const format_entry* pEntry, trace_bytes* pRun, int bAddr64) {
-    static parm_list list;
+    parm_list list;
     bld_parm_list_packed(pEntry, pRun, bAddr64, &list);
     format_parms(pEntry, &list, bAddr64);
 }
@@ -220,7 +220,7 @@ TEST(parms, unpacked_parameters_take_a_block_each) {
         {"%d", byte_vector(3), 1, "%d\n", 3},
     };
     for (const auto& row : cases) {
-        static parm_list list;
+        parm_list list;
         trace_bytes blocks = row.blocks;
         const entry_ptr pEntry = compile(row.format);
         const auto write = [&] {

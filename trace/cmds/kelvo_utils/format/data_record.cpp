@@ -33,7 +33,7 @@ uint32_t write_leading_blocks(const record_view& record, const format_entry* pFo
         format_parms(pFormat, nullptr, record.pFile->addrMode64);
         return 0;
     }
-    static constinit parm_list parms{}; // static: see format_packed_parms
+    parm_list parms;
     bld_parm_list_unpacked(pFormat, pBlocks, uBlocks, &parms);
     format_parms(pFormat, &parms, record.pFile->addrMode64);
     return static_cast<uint32_t>(parms.numParms);

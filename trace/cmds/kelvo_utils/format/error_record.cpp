@@ -135,17 +135,16 @@ message_text build_message(const record_view& record, const error_texts& texts) 
 /// The NUL of the string belongs to its bytes, which any conversion may read.
 parm_ref string_parm(const char* pString) {
     const std::string_view string = pString ? pString : "";
-    return {.bytes = std::as_bytes(std::span(string.data(), string.size() + 1)),
-            .uStringLimit = static_cast<uint32_t>(string.size())};
+    return make_parm_ref(std::as_bytes(std::span(string.data(), string.size() + 1)), string.size());
 }
 
 parm_ref int_parm(trace_bytes bytes, size_t uOffset) {
-    return {.bytes = load_run(bytes, uOffset, sizeof(int32_t)), .uStringLimit = sizeof(int32_t)};
+    return make_parm_ref(load_run(bytes, uOffset, sizeof(int32_t)), sizeof(int32_t));
 }
 
 void write_by_format(const format_entry* pFormatEntry, const record_view& record,
                      const error_texts& texts, const char* pMessage) {
-    static constinit parm_list parms{}; // static: see format_packed_parms
+    parm_list parms;
     parms.pParms[0] = int_parm(record.bytes, offsetof(trace_record_error, errorId));
     parms.pParms[1] = string_parm(texts.pFunction);
     parms.pParms[2] = int_parm(record.bytes, offsetof(trace_record_error, lineNumber));

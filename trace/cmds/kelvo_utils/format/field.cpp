@@ -69,16 +69,11 @@ constexpr int64_t MAX_WIDTH = MAX_PRINTED_TEXT + MAX_PRECISION + 1000;
 
 /// Makes "%*.*" with the conversion's flags before and `length` and its letter behind.
 void make_plain_conversion(char (&plain)[16], const conversion& conv, std::string_view length) {
-    constexpr struct {
-        uint8_t uBit;
-        char ch;
-    } flags[] = {{CONVERSION_LEFT, '-'},   {CONVERSION_PLUS, '+'}, {CONVERSION_SPACE, ' '},
-                 {CONVERSION_ALTERN, '#'}, {CONVERSION_ZERO, '0'}, {CONVERSION_GROUP, '\''}};
     char* pEnd = plain;
     *pEnd++ = '%';
-    for (const auto& flag : flags)
-        if (conv.uFlags & flag.uBit)
-            *pEnd++ = flag.ch;
+    for (size_t i = 0; i < PRINTF_FLAGS.size(); i++)
+        if (conv.uFlags & 1U << i)
+            *pEnd++ = PRINTF_FLAGS[i];
     pEnd = std::copy_n("*.*", 3, pEnd);
     pEnd = std::copy(length.begin(), length.end(), pEnd);
     *pEnd++ = conv.letter;

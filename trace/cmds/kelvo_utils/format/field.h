@@ -6,7 +6,7 @@
 // padding is counted, not made.
 #pragma once
 
-#include "conversion.h"
+#include "format_plan.h"
 #include "text_run.h"
 
 #include <string_view>

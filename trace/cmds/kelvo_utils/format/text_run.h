@@ -2,7 +2,7 @@
 // single characters. Main thread only.
 #pragma once
 
-#include "kelvo.h"
+#include "format_plan.h"
 #include "print.h"
 #include "sink.h"
 
