@@ -13,7 +13,7 @@ namespace {
 void write_block_plainly(uint32_t uBlock, trace_bytes data) {
     text_run out;
     out.add("----------------- Data Block ");
-    put_decimal(out, uBlock);
+    add_decimal(out, uBlock);
     out.add(" ----------------");
     out.flush();
     format_hex(data);
@@ -25,7 +25,7 @@ uint32_t write_leading_blocks(const record_view& record, const format_entry* pFo
                               uint32_t uBlocks, trace_bytes* pBlocks) {
     if (!pFormat) {
         text_run out;
-        put_trace_id(out, record.uTraceId);
+        add_trace_id(out, record.uTraceId);
         out.add('\n');
         return 0;
     }

@@ -178,7 +178,7 @@ private:
 /// The form without a format.
 void write_plainly(const record_view& record, const error_texts& texts, const char* pMessage) {
     text_run out;
-    put_trace_id(out, record.uTraceId);
+    add_trace_id(out, record.uTraceId);
     error_text(out)
         .add("Error ")
         .add(load<int32_t>(record.bytes, offsetof(trace_record_error, errorId)))

@@ -45,12 +45,12 @@ std::string_view literal(const format_piece& piece) {
 }
 
 void write_resource_handle(text_run& out, trace_bytes bytes) {
-    put_hex(out, load<uint16_t>(bytes, 0), 4);
+    add_hex(out, load<uint16_t>(bytes, 0), 4);
     out.add(' ');
-    put_hex(out, load<uint16_t>(bytes, 2), 4);
+    add_hex(out, load<uint16_t>(bytes, 2), 4);
     for (size_t uOffset = 4; uOffset < 20; uOffset += 4) {
         out.add(' ');
-        put_hex(out, load<uint32_t>(bytes, uOffset), 8);
+        add_hex(out, load<uint32_t>(bytes, uOffset), 8);
     }
 }
 
