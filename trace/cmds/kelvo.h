@@ -94,11 +94,9 @@ struct template_file {
     char* preload_path;     ///< file found by the preload, heap text; null when loaded on demand
 
     // What makes looking up quick:
-    format_index_slot* pIndex;        ///< pFormats by ids; null for a small template
-    size_t uIndexSize;                ///< slots of pIndex
-    format_index_slot* pTraceIdIndex; ///< the newest entry of each trace id; null likewise
-    size_t uTraceIdIndexSize;         ///< slots of pTraceIdIndex
-    template_file* pNextInChain;      ///< on-demand templates whose ids hash alike
+    format_index_slot* pIndex;   ///< pFormats by ids; null for a small template
+    size_t uIndexSize;           ///< slots of pIndex
+    template_file* pNextInChain; ///< on-demand templates whose ids hash alike
 };
 
 // -------------------------------------------------------------- trace files
