@@ -27,11 +27,9 @@ int read_first_on_path(template_file* pTemplate, int* p_insufficient_resources) 
         file_name_text name;
         if (!build_template_file_name(directory, pTemplate->compId, &name))
             continue;
-        file_owner pFile;
-        if (open_template_file(name.text, &pFile))
-            return pFile == nullptr
-                       ? 0
-                       : read_template(pTemplate, name.text, pFile.get(), p_insufficient_resources);
+        const int iResult = read_template_file(pTemplate, name.text, p_insufficient_resources);
+        if (iResult >= 0)
+            return iResult;
     }
     return 0;
 }

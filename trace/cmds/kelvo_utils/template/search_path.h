@@ -1,10 +1,8 @@
-// The template search path: its directories, and the files in them.
+// The template search path: its directories, and the names of the files in them.
 #pragma once
 
 #include "kelvo.h"
 
-#include <cstdio>
-#include <memory>
 #include <string_view>
 
 /// Room for the name of a template file, with its NUL.
@@ -22,13 +20,6 @@ struct file_name_text {
     bool append_slash();
 };
 
-struct file_closer {
-    void operator()(FILE* pFile) const {
-        std::fclose(pFile);
-    }
-};
-using file_owner = std::unique_ptr<FILE, file_closer>;
-
 /// Takes the first directory off `*pPath`. It may be empty (the current working
 /// directory). False when nothing is left.
 bool take_first_directory(std::string_view* pPath, std::string_view* pDirectory);
@@ -42,8 +33,3 @@ bool take_last_directory(std::string_view* pPath, std::string_view* pDirectory);
 /// long, or the current working directory is needed and cannot be determined.
 bool build_template_file_name(std::string_view directory, const char* compId,
                               file_name_text* pName);
-
-/// Opens a template file for reading. Returns false when it cannot be opened;
-/// `*pFile` is null, too, when it is no regular file: it has no entries then, since
-/// reading a FIFO or a device could hang the run.
-bool open_template_file(const char* pFileName, file_owner* pFile);

@@ -5,6 +5,9 @@
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 /// A pair of ids and the entry that answers for it. The index is an array of
 /// these, ordered by key, so that a large template costs a few comparisons per
@@ -92,6 +95,21 @@ int read_template(template_file* pTemplate, const char* pFileName, FILE* pFile,
     if (iResult == 0)
         build_format_index(pTemplate);
     return iResult;
+}
+
+int read_template_file(template_file* pTemplate, const char* pFileName,
+                       int* p_insufficient_resources) {
+    const int fd = open(pFileName, O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
+    if (fd < 0)
+        return -1;
+    struct stat status;
+    const bool bRegular = fstat(fd, &status) == 0 && S_ISREG(status.st_mode);
+    const file_owner pFile(bRegular ? fdopen(fd, "r") : nullptr);
+    if (pFile == nullptr) {
+        close(fd);
+        return bRegular ? -1 : 0;
+    }
+    return read_template(pTemplate, pFileName, pFile.get(), p_insufficient_resources);
 }
 
 format_entry* find_format(const template_file* pTemplate, uint32_t trace_id, int block_id) {
