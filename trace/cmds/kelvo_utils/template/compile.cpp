@@ -294,8 +294,8 @@ constexpr size_t round_up(size_t uValue, size_t uMultiple) {
 format_entry* make_entry(const format_scan& scan) {
     static_assert(sizeof(format_entry) % alignof(conv_spec) == 0);
     static_assert(sizeof(parm_type_t) == 1);
-    static_assert(alignof(format_plan) >= alignof(conversion));
-    static_assert(alignof(conversion) >= alignof(format_piece));
+    static_assert(alignof(format_plan) >= alignof(format_piece));
+    static_assert(alignof(format_piece) >= alignof(conversion));
     const auto uConvs = static_cast<size_t>(scan.numConvs);
     const auto uParms = static_cast<size_t>(scan.numParms);
     const size_t uStringSize = std::strlen(scan.pString) + 1;
@@ -303,9 +303,9 @@ format_entry* make_entry(const format_scan& scan) {
     const size_t uTypesAt = uConvsAt + uConvs * sizeof(conv_spec);
     const size_t uStringAt = uTypesAt + uParms;
     const size_t uPlanAt = round_up(uStringAt + uStringSize, alignof(format_plan));
-    const size_t uConversionsAt = uPlanAt + sizeof(format_plan);
-    const size_t uPiecesAt = uConversionsAt + uConvs * sizeof(conversion);
-    const size_t uTextAt = uPiecesAt + (uConvs + 1) * sizeof(format_piece);
+    const size_t uPiecesAt = uPlanAt + sizeof(format_plan); // every record needs these two
+    const size_t uConversionsAt = uPiecesAt + (uConvs + 1) * sizeof(format_piece);
+    const size_t uTextAt = uConversionsAt + uConvs * sizeof(conversion);
 
     auto* const pBlock = static_cast<std::byte*>(std::malloc(uTextAt + uStringSize + PADDED_TEXT));
     if (pBlock == nullptr)
