@@ -29,7 +29,7 @@ void check_rest(trace_bytes all, trace_bytes rest) {
 }
 
 void write_packed(const format_entry* pEntry, trace_bytes body, int bAddr64) {
-    static parm_list parms;
+    parm_list parms;
     trace_bytes rest = body;
     bld_parm_list_packed(pEntry, &rest, bAddr64, &parms);
     check_rest(body, rest);
@@ -38,7 +38,7 @@ void write_packed(const format_entry* pEntry, trace_bytes body, int bAddr64) {
 }
 
 void write_unpacked(const format_entry* pEntry, trace_bytes body, int bAddr64) {
-    static parm_list parms;
+    parm_list parms;
     trace_bytes rest = body;
     bld_parm_list_unpacked(pEntry, &rest, UINT32_MAX, &parms);
     check_rest(body, rest);

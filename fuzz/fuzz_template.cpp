@@ -2,7 +2,6 @@
 #include "fuzz_target.h"
 #include "hostile_harness.h"
 
-#include "search_path.h"
 #include "template_file.h"
 
 #include <cstdio>

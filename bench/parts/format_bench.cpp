@@ -109,7 +109,7 @@ void find_and_write_blocks(benchmark::State& state) {
         parse_format_string("item %u, %d units at %d cents, from %s", nullptr));
     const std::vector<std::byte> blocks = packed(4, 116'039'725, 4, 360, 4, 38'655, 7, NODE, '\0');
     const output_to_nowhere nowhere;
-    static parm_list list;
+    parm_list list;
     for (auto _ : state) {
         trace_bytes run = blocks;
         bld_parm_list_unpacked(pEntry.get(), &run, 4, &list);

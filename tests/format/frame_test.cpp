@@ -151,18 +151,22 @@ TEST_F(Frame, WritesTextAsItWritesItsCharacters) {
     }
 }
 
-TEST_F(Frame, DeepNestingNeitherWrapsNorHidesLines) {
+TEST_F(Frame, DeepNestingIsIndentedIn16Bits) {
     record("");
     taken();
-    for (const int level : {1000, 16382, 16383, 16384, 32767, 40000, 65535}) {
+    const std::pair<int, size_t> columns[] = {{1000, 2001}, {16383, 32767}, {16384, 0},
+                                              {32767, 0},   {32768, 1},     {40000, 14465}};
+    for (const auto& [level, uColumn] : columns) {
         file.pThreadInfo->nestingLevel = static_cast<uint16_t>(level);
-        record(">>x\ny");
-        const std::string line(static_cast<size_t>(std::min<int>(1 + 2 * level, MAX_INDENT)), ' ');
+        record(">>x\ny\n");
+        const std::string line(uColumn, ' ');
         EXPECT_TRUE(taken() == line + "x\n" + line + "y\n") << level;
-        EXPECT_EQ(file.pThreadInfo->nestingLevel, std::min(level + 1, 65535));
+        EXPECT_EQ(file.pThreadInfo->nestingLevel, level + 1);
     }
-    record(">-");
-    EXPECT_TRUE(taken() == std::string(MAX_INDENT, ' ') + ">-\n");
+    file.pThreadInfo->nestingLevel = 65535;
+    record(">>-\n");
+    record(">-\n");
+    EXPECT_EQ(taken(), "-\n>-\n");
 }
 
 TEST_F(Frame, KeepsThreadsApartHoweverManyThereAre) {

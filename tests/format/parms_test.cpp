@@ -49,7 +49,7 @@ std::string output_of(const std::function<void()>& writes) {
 /// What format_packed_parms does in one go in two steps, the second of which data
 /// records share.
 void write_listed(const format_entry* pEntry, trace_bytes* pRun, int bAddr64) {
-    static parm_list list;
+    parm_list list;
     bld_parm_list_packed(pEntry, pRun, bAddr64, &list);
     format_parms(pEntry, &list, bAddr64);
 }
@@ -121,8 +121,12 @@ TEST(parms, packed_parameters_print_in_their_places) {
         {"%1$f %1$p %1$r %1$T %1$z %1$d", raw_bytes(i), "%1$f %1$p %1$r %1$T %1$z 7"},
         {"%2$*1$z|%1$d", raw_bytes(i), "|7"}, // the rest is nothing, at any width
         {"%1$d %1$f", raw_bytes(0.5), "%1$d 0.500000"},
-        {"%1$d %1$hx %1$lld", raw_bytes(INT64_MIN),
-         "-9223372036854775808 8000000000000000 -9223372036854775808"},
+        // It is printed as wide as each place asks for, whatever it holds.
+        {"%1$hd %1$d", raw_bytes(70'000), "4464 70000"},
+        {"%1$d %1$hx %1$Ld %1$lld", raw_bytes(-0x6789ABCDEFLL),
+         "1985229329 3211 1985229329 -444691369455"},
+        {"%1$llx %1$o %1$ld %1$hd", raw_bytes(int16_t{-2}), "fffffffffffffffe 37777777776 -2 -2"},
+        {"%1$lx %1$d %1$u", raw_bytes(-1), "ffffffff -1 4294967295", 0, 0},
         {"%2$*1$d %1$s", raw_bytes("\5\0\0\0"sv, i), "    7 \5"},
         // 39 characters of a rebuilt text are the most.
         {"%" + std::string(37, '0') + "d", raw_bytes(i), "7"},
@@ -216,7 +220,7 @@ TEST(parms, unpacked_parameters_take_a_block_each) {
         {"%d", byte_vector(3), 1, "%d\n", 3},
     };
     for (const auto& row : cases) {
-        static parm_list list;
+        parm_list list;
         trace_bytes blocks = row.blocks;
         const entry_ptr pEntry = compile(row.format);
         const auto write = [&] {
@@ -246,8 +250,12 @@ TEST(parms, huge_widths_and_precisions_keep_what_is_shown) {
         {"%2000000000.1999999990f", raw_bytes(0.5), "        0.5" + zeros.substr(11)},
         {"%.2147483647s", raw_bytes("ab\0"sv), "ab"},
         {"%2000000000p", raw_bytes(int64_t{16}), blanks},
+        {"%.2147483645p", raw_bytes(int64_t{16}), "0x" + zeros.substr(2)},
+        {"%.2147483646p", raw_bytes(int64_t{16}), replacement},
+        {"%.2147483647p|%.2147483646p", raw_bytes(int64_t{0}, int64_t{0}), "(nil)|(nil)"},
         {"%2147483648d", raw_bytes(5), replacement},
         {"%99999999999999999999f", raw_bytes(0.5), replacement},
+        {"%.2147483648g", raw_bytes(0.5), replacement},
         {"%.2147483648s", raw_bytes("ab\0"sv), replacement},
         {"%*d", raw_bytes(5, INT_MIN), replacement},
         {"%*f", raw_bytes(0.5, INT_MIN), replacement},
@@ -267,8 +275,9 @@ packed_case make_conversion(std::mt19937_64& random) {
     std::string flags;
     for (int i = one_of(random, {0, 0, 1, 1, 2, 3}); i > 0; i--)
         flags += one_of(random, {'-', '+', ' ', '#', '0', '\'', 'B'});
-    const int iWidth = one_of(random, {0, 0, 1, 5, 12, 30, 4090, 4095, 4096, 5000, -7, -5000});
-    const int iPrecision = one_of(random, {-1, -1, -1, 0, 1, 5, 20, 300, 4000, 4096, 5000});
+    const int iWidth =
+        one_of(random, {0, 0, 1, 5, 12, 30, 4090, 4095, 4096, 5000, 10000, -7, -5000});
+    const int iPrecision = one_of(random, {-1, -1, -1, 0, 1, 5, 20, 300, 4000, 4096, 5197, 6000});
     const std::string modifier = one_of(random, {"", "h", "l", "ll", "L"});
     const std::string_view letters = "ddiuxXocsfeEgGp";
     const char letter = letters[random() % letters.size()];

@@ -82,6 +82,7 @@ constexpr char templateText[] = R"(
 0x0b ">>enter"
 0x0c "at %d 100%%\n"
 0x0d "[%T]"
+0x0e "%1$d %2$s %3$d %4$d"
 )";
 
 class record_test : public testing::Test {
@@ -225,6 +226,16 @@ byte_vector error_body(uint32_t uTraceId, const std::string& ffdcId,
                      ffdcId, '\0', defaultText);
 }
 
+TEST_F(record_test, refused_template_is_read_for_a_data_record_and_for_each_block) {
+    std::ofstream(directory.file("BAD_.tpl")) << "1 \"%q\"\n";
+    CaptureStderr();
+    format(TRC_FUNC_DATA, raw_bytes(1U, 2U, block("Z"), block("")), "BAD_");
+    std::string messages;
+    for (int i = 0; i < 3; i++)
+        messages += "kelvo: 2625-120 Format error on line 1. Invalid data type q specified.\n\n";
+    EXPECT_EQ(GetCapturedStderr(), messages);
+}
+
 TEST_F(record_test, error_records) {
     const std::string plain =
         " id=0x00000030Error -2 was returned from \"open\" on line 12 in file \"a.c\".\n";
@@ -237,9 +248,13 @@ TEST_F(record_test, error_records) {
     // The default text runs to the end of the record without a NUL.
     EXPECT_EQ(text_of(0x30, "ff-1", "disk %s: %d"),
               plain + "    Message=disk sda1: 28\n    FFDCID=\"ff-1\"\n");
-    EXPECT_EQ(text_of(0x30, "", longText), plain + "    Message=" + longText + "\n");
+    // 4095 characters of each text are kept.
+    EXPECT_EQ(text_of(0x30, longText, longText), plain + "    Message=" + std::string(4084, 'm') +
+                                                     "\n    FFDCID=\"" + std::string(4084, 'm') +
+                                                     "\n");
     EXPECT_EQ(text_of(10, "ff-1", "disk %s: %d"), " error -2 open 12 a.c (disk sda1: 28) <ff-1>\n");
     EXPECT_EQ(text_of(10, "", ""), " error -2 open 12 a.c () <>\n");
+    EXPECT_EQ(text_of(14, "", ""), " -2 open 12 6499937\n"); // "a.c" with its NUL
 }
 
 TEST_F(record_test, error_records_with_false_offsets_and_counts) {

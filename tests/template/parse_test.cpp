@@ -1,6 +1,5 @@
 #include "parse.h"
 
-#include "search_path.h"
 #include "template_file.h"
 #include "template_support.h"
 

@@ -21,6 +21,7 @@
 #include <pthread.h>
 
 struct format_index_slot;
+struct format_plan;
 struct template_file;
 struct trace_file;
 
@@ -68,48 +69,8 @@ struct conv_spec {
 /// Bits of format_entry::properties.
 enum : int32_t { FORMAT_NUMBERED_PARMS = 1 };
 
-/// Readable bytes from the begin of a format's literal text on.
-inline constexpr size_t PADDED_TEXT = 16;
-
-/// Literal text of a format string as it is written, "%%" as one percent sign,
-/// and how the conversion behind it is written.
-struct format_piece {
-    const char* pText; ///< PADDED_TEXT bytes can be read there, however short it is
-    uint32_t uLength;
-    uint8_t uDirect; ///< a direct_writer; found out when the format is first written
-    uint8_t uWidth;  ///< of a number that is written directly
-    bool bZeros;     ///< it is filled up with zeros rather than blanks
-
-    // Of a leading number, for the traces of 32-bit and of 64-bit programs:
-    uint8_t uShape[2];   ///< an integer_shape
-    uint16_t uOffset[2]; ///< of its parameter in a packed run
-};
-
-/// The conversions that a format which uses its parameters in order begins with, as
-/// far as they are numbers written directly, with no newline between them and no
-/// marker at the start, and fit into some hundred bytes. In a packed run their
-/// parameters have fixed places. Found out when the format is first written.
-struct leading_numbers {
-    bool bKnown;
-    bool bTakesRest;  ///< behind them the rest of the run is taken, and nothing printed
-    uint8_t uCount;   ///< the numbers
-    uint16_t uEnd[2]; ///< of the last one's parameter: the run must be as long
-};
-
-/// Writers of the usual conversions, which go by nothing but the value.
-enum direct_writer : uint8_t {
-    DIRECT_UNKNOWN = 0, ///< not yet looked at
-    DIRECT_NONE,        ///< goes by its text each time
-    DIRECT_NOTHING,     ///< prints nothing
-    DIRECT_SIGNED,
-    DIRECT_UNSIGNED,
-    DIRECT_HEX,
-    DIRECT_CHAR,
-    DIRECT_STRING,
-};
-
 /// A compiled format string. One allocation holds the entry, its conversions,
-/// its parameter types, its string, and its literal pieces with their text.
+/// its parameter types, its string, and the plan by which it is written.
 struct format_entry {
     format_entry* pNext;     ///< next entry of the same file, older
     template_file* pFile;    ///< owner; null for an internal format
@@ -121,12 +82,7 @@ struct format_entry {
     int32_t numConvs;        ///< conversions, in order of appearance
     conv_spec* pConvSpecs;   ///< numConvs conversions
     char* pString;           ///< the whole format string, NUL-terminated
-
-    // Not part of the format of the record, but kept beside it:
-    format_piece* pPieces; ///< numConvs + 1: before each conversion, and after the last one
-                           ///< (there without a newline at the very end)
-    bool bParmsInOrder;    ///< the conversions use the parameters in order, each once, without '*'
-    mutable leading_numbers leading; ///< when they do
+    format_plan* pPlan;      ///< how it is written, template/format_plan.h
 };
 
 /// The formats of one component.
@@ -137,12 +93,10 @@ struct template_file {
     format_entry* pFormats; ///< newest first
     char* preload_path;     ///< file found by the preload, heap text; null when loaded on demand
 
-    // Not part of the format of the record, but kept beside it:
-    format_index_slot* pIndex;        ///< pFormats by ids; null for a small template
-    size_t uIndexSize;                ///< slots of pIndex
-    format_index_slot* pTraceIdIndex; ///< the newest entry of each trace id; null likewise
-    size_t uTraceIdIndexSize;         ///< slots of pTraceIdIndex
-    template_file* pNextInChain;      ///< on-demand templates whose ids hash alike
+    // What makes looking up quick:
+    format_index_slot* pIndex;   ///< pFormats by ids; null for a small template
+    size_t uIndexSize;           ///< slots of pIndex
+    template_file* pNextInChain; ///< on-demand templates whose ids hash alike
 };
 
 // -------------------------------------------------------------- trace files

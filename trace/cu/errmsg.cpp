@@ -27,69 +27,37 @@ namespace {
 
 constexpr size_t MAX_MESSAGE_TEXT = 65'535;
 
-/// The text as it grows; NUL-terminated.
+/// The text as it grows.
 class message_text {
 public:
-    void add(std::string_view text) {
-        text = text.substr(0, MAX_MESSAGE_TEXT - uLength);
-        if (!reserve(text.size()))
-            return;
-        memcpy(pText.get() + uLength, text.data(), text.size());
-        uLength += text.size();
+    void add(std::string_view piece) {
+        piece = piece.substr(0, MAX_MESSAGE_TEXT - uLength);
+        piece.copy(text + uLength, piece.size());
+        uLength += piece.size();
     }
 
     /// Adds what printf makes of the given conversion, width, precision and value.
     template <class T>
     void add_formatted(const char* pConversion, int iWidth, int iPrecision, T value) {
-        for (size_t uNeeded = 32; reserve(uNeeded);) {
-            const size_t uFree = uCapacity - uLength;
-            const int iLength =
-                snprintf(pText.get() + uLength, uFree, pConversion, iWidth, iPrecision, value);
-            if (iLength < 0)
-                return;
-            const auto uMade = static_cast<size_t>(iLength);
-            if (uMade < uFree || uCapacity > MAX_MESSAGE_TEXT) {
-                uLength += std::min(uMade, uFree - 1);
-                return;
-            }
-            uNeeded = uMade;
-        }
+        const int iLength = snprintf(text + uLength, MAX_MESSAGE_TEXT + 1 - uLength, pConversion,
+                                     iWidth, iPrecision, value);
+        if (iLength > 0)
+            uLength = std::min(uLength + static_cast<size_t>(iLength), MAX_MESSAGE_TEXT);
     }
 
     bool is_full() const {
-        return bFailed || uLength >= MAX_MESSAGE_TEXT;
+        return uLength == MAX_MESSAGE_TEXT;
     }
 
-    /// Hands the text over; null when memory ran out.
-    char* release() {
-        if (!reserve(0))
-            return nullptr;
-        pText.get()[uLength] = '\0';
-        return pText.release();
+    /// A copy in a heap block, or null when memory ran out.
+    char* copy() {
+        text[uLength] = '\0';
+        return strdup(text);
     }
 
 private:
-    /// Makes room for `uMore` characters and a NUL, as far as the limit goes.
-    bool reserve(size_t uMore) {
-        const size_t uWanted = std::min(uLength + uMore, MAX_MESSAGE_TEXT) + 1;
-        if (bFailed || uWanted <= uCapacity)
-            return !bFailed;
-        const size_t uSize = std::min(std::max(uWanted, 2 * uCapacity), MAX_MESSAGE_TEXT + 1);
-        char* pGrown = static_cast<char*>(realloc(pText.get(), uSize));
-        if (!pGrown) {
-            bFailed = true;
-            return false;
-        }
-        (void)pText.release(); // realloc has released or kept the block
-        pText.reset(pGrown);
-        uCapacity = uSize;
-        return true;
-    }
-
-    heap_text pText;
+    char text[MAX_MESSAGE_TEXT + 1]; ///< not set up: most texts need little of it
     size_t uLength = 0;
-    size_t uCapacity = 0;
-    bool bFailed = false;
 };
 
 /// A width or a precision of a conversion.
@@ -340,7 +308,7 @@ int cu_get_errmsg_1(const cu_error_t* errorBlk, char** message) {
     message_text text;
     argument_list arguments(*errorBlk);
     add_message(text, pFormat, arguments);
-    *message = text.release();
+    *message = text.copy();
     return *message ? 0 : -1;
 }
 

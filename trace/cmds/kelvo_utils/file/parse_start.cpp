@@ -80,7 +80,7 @@ int parse_date_and_time(const char* pText) {
     tm attempt = start;
     if (const char* const pBehindDate = strptime(pText, "%x", &attempt)) {
         start = attempt;
-        pText = skip_white_space(pBehindDate); // some locales' times begin with a word
+        pText = pBehindDate;
     }
     attempt = start;
     const char* const pBehindTime = strptime(pText, "%X", &attempt);

@@ -6,7 +6,6 @@
 #include "hex.h"
 #include "record_bodies.h"
 #include "record_text.h"
-#include "store.h"
 
 namespace {
 
@@ -14,7 +13,7 @@ namespace {
 void write_block_plainly(uint32_t uBlock, trace_bytes data) {
     text_run out;
     out.add("----------------- Data Block ");
-    put_decimal(out, uBlock);
+    add_decimal(out, uBlock);
     out.add(" ----------------");
     out.flush();
     format_hex(data);
@@ -26,7 +25,7 @@ uint32_t write_leading_blocks(const record_view& record, const format_entry* pFo
                               uint32_t uBlocks, trace_bytes* pBlocks) {
     if (!pFormat) {
         text_run out;
-        put_trace_id(out, record.uTraceId);
+        add_trace_id(out, record.uTraceId);
         out.add('\n');
         return 0;
     }
@@ -34,7 +33,7 @@ uint32_t write_leading_blocks(const record_view& record, const format_entry* pFo
         format_parms(pFormat, nullptr, record.pFile->addrMode64);
         return 0;
     }
-    static constinit parm_list parms{}; // static: see format_packed_parms
+    parm_list parms;
     bld_parm_list_unpacked(pFormat, pBlocks, uBlocks, &parms);
     format_parms(pFormat, &parms, record.pFile->addrMode64);
     return static_cast<uint32_t>(parms.numParms);
@@ -55,15 +54,10 @@ int format_data_record(const record_view& record) {
     if (anchor.bBrief)
         return 0;
 
-    // A refused template file is read again by every record, not by every block:
-    // a record may have very many.
-    const bool bAskForBlocks = template_is_loaded(record.pElement->header.compId);
     trace_bytes data;
     for (uint32_t i = uFirstFree; i < uBlocks && take_data_block(&blocks, &data); i++) {
-        pFormat = nullptr;
-        if (bAskForBlocks)
-            pFormat = find_record_format(record, record.uTraceId, static_cast<int>(i),
-                                         &insufficient_resources);
+        pFormat = find_record_format(record, record.uTraceId, static_cast<int>(i),
+                                     &insufficient_resources);
         if (insufficient_resources)
             return 1;
         if (pFormat)

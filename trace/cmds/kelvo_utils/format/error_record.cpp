@@ -6,6 +6,7 @@
 // has none runs to the record's end, so one NUL put behind the record ends all
 // of them; the queue element leaves room for it.
 
+#include "digits.h"
 #include "format_text.h"
 #include "insufficient.h"
 #include "record_bodies.h"
@@ -13,6 +14,7 @@
 
 #include <algorithm>
 #include <array>
+#include <charconv>
 #include <memory>
 #include <new>
 #include <string_view>
@@ -130,19 +132,19 @@ message_text build_message(const record_view& record, const error_texts& texts) 
     return message_text(pMessage);
 }
 
+/// The NUL of the string belongs to its bytes, which any conversion may read.
 parm_ref string_parm(const char* pString) {
     const std::string_view string = pString ? pString : "";
-    return {.bytes = std::as_bytes(std::span(string.data(), string.size())),
-            .uStringLimit = static_cast<uint32_t>(string.size())};
+    return make_parm_ref(std::as_bytes(std::span(string.data(), string.size() + 1)), string.size());
 }
 
 parm_ref int_parm(trace_bytes bytes, size_t uOffset) {
-    return {.bytes = load_run(bytes, uOffset, sizeof(int32_t)), .uStringLimit = sizeof(int32_t)};
+    return make_parm_ref(load_run(bytes, uOffset, sizeof(int32_t)), sizeof(int32_t));
 }
 
 void write_by_format(const format_entry* pFormatEntry, const record_view& record,
                      const error_texts& texts, const char* pMessage) {
-    static constinit parm_list parms{}; // static: see format_packed_parms
+    parm_list parms;
     parms.pParms[0] = int_parm(record.bytes, offsetof(trace_record_error, errorId));
     parms.pParms[1] = string_parm(texts.pFunction);
     parms.pParms[2] = int_parm(record.bytes, offsetof(trace_record_error, lineNumber));
@@ -153,33 +155,48 @@ void write_by_format(const format_entry* pFormatEntry, const record_view& record
     format_parms(pFormatEntry, &parms, 0);
 }
 
-void put_text(text_run& out, const char* pText) {
-    if (pText)
-        out.add(std::string_view(pText));
-}
+/// A text with what printf's "%s" and "%d" would write between its parts.
+class error_text {
+public:
+    explicit error_text(text_run& out) : text(out) {}
 
-/// The form without a format. Strings are written whole, however long they are.
+    error_text& add(const char* pText) {
+        text.add(pText ? pText : "");
+        return *this;
+    }
+    error_text& add(int32_t iNumber) {
+        char digits[DIGITS_ROOM];
+        const char* pEnd = std::to_chars(digits, std::end(digits), iNumber).ptr;
+        text.add({digits, static_cast<size_t>(pEnd - digits)});
+        return *this;
+    }
+
+private:
+    kept_text text;
+};
+
+/// The form without a format.
 void write_plainly(const record_view& record, const error_texts& texts, const char* pMessage) {
     text_run out;
-    put_trace_id(out, record.uTraceId);
-    out.add("Error ");
-    put_decimal(out, load<int32_t>(record.bytes, offsetof(trace_record_error, errorId)));
-    out.add(" was returned from \"");
-    put_text(out, texts.pFunction);
-    out.add("\" on line ");
-    put_decimal(out, load<int32_t>(record.bytes, offsetof(trace_record_error, lineNumber)));
-    out.add(" in file \"");
-    put_text(out, texts.pFile);
-    out.add("\".\n");
+    add_trace_id(out, record.uTraceId);
+    error_text(out)
+        .add("Error ")
+        .add(load<int32_t>(record.bytes, offsetof(trace_record_error, errorId)))
+        .add(" was returned from \"")
+        .add(texts.pFunction)
+        .add("\" on line ")
+        .add(load<int32_t>(record.bytes, offsetof(trace_record_error, lineNumber)))
+        .add(" in file \"")
+        .add(texts.pFile)
+        .add("\".");
+    out.add('\n');
     if (pMessage) {
-        out.add("   Message=");
-        put_text(out, pMessage);
+        error_text(out).add("   Message=").add(pMessage);
         out.add('\n');
     }
     if (texts.pFfdcId) {
-        out.add("   FFDCID=\"");
-        put_text(out, texts.pFfdcId);
-        out.add("\"\n");
+        error_text(out).add("   FFDCID=\"").add(texts.pFfdcId).add("\"");
+        out.add('\n');
     }
 }
 

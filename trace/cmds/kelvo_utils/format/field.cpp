@@ -8,9 +8,12 @@
 
 #include "print.h"
 
+#include <algorithm>
 #include <charconv>
 #include <climits>
+#include <cmath>
 #include <cstdint>
+#include <cstdio>
 
 namespace {
 
@@ -24,28 +27,6 @@ struct field_parts {
 int64_t size_of(std::string_view text) {
     return static_cast<int64_t>(text.size());
 }
-
-/// A text of which only the first MAX_FIELD_TEXT characters go out.
-class kept_text {
-public:
-    explicit kept_text(text_run& run) : out(run) {}
-
-    void add(std::string_view piece) {
-        piece = piece.substr(0, uLeft);
-        out.add(piece);
-        uLeft -= piece.size();
-    }
-
-    void fill(char ch, int64_t iCount) {
-        const size_t uCount = std::min(static_cast<size_t>(iCount), uLeft);
-        out.fill(ch, uCount);
-        uLeft -= uCount;
-    }
-
-private:
-    text_run& out;
-    size_t uLeft = MAX_FIELD_TEXT;
-};
 
 /// printf refuses a width or precision that an int does not hold.
 bool is_refused(const conversion& conv) {
@@ -72,33 +53,49 @@ void write_parts(text_run& out, const conversion& conv, const field_parts& parts
         kept.fill(' ', iPadding);
 }
 
-/// Writes a value by output_printf, with a conversion made here from the parts.
-template <class T>
-void write_by_printf(text_run& out, const conversion& conv, const char* pLength, T value) {
-    if (is_refused(conv)) {
-        out.add(UNFORMATTABLE);
-        return;
-    }
-    constexpr struct {
-        uint8_t uBit;
-        char ch;
-    } flags[] = {{CONVERSION_LEFT, '-'},   {CONVERSION_PLUS, '+'}, {CONVERSION_SPACE, ' '},
-                 {CONVERSION_ALTERN, '#'}, {CONVERSION_ZERO, '0'}, {CONVERSION_GROUP, '\''}};
-    char plain[16];
+// glibc writes the padding of a wide conversion to its end even when the buffer is
+// long full, and builds a precise number in memory as a whole: a width of
+// 2,000,000,000 takes seconds, a precision gigabytes. So both are lowered as far as
+// the characters that are kept stay the same.
+
+// A precision beyond this only adds zeros behind the characters that are kept:
+// a double has at most 1,074 digits after the point.
+constexpr int64_t MAX_PRECISION = MAX_PRINTED_TEXT + 1100;
+
+// A width above this is padding for all characters that are kept: no double has more
+// digits before the point than 309, which may be grouped, and none has more than
+// MAX_PRECISION after it.
+constexpr int64_t MAX_WIDTH = MAX_PRINTED_TEXT + MAX_PRECISION + 1000;
+
+/// Makes "%*.*" with the conversion's flags before and `length` and its letter behind.
+void make_plain_conversion(char (&plain)[16], const conversion& conv, std::string_view length) {
     char* pEnd = plain;
     *pEnd++ = '%';
-    for (const auto& flag : flags)
-        if (conv.uFlags & flag.uBit)
-            *pEnd++ = flag.ch;
-    for (const char* pPart = "*.*"; *pPart; pPart++)
-        *pEnd++ = *pPart;
-    for (const char* pPart = pLength; *pPart; pPart++)
-        *pEnd++ = *pPart;
+    for (size_t i = 0; i < PRINTF_FLAGS.size(); i++)
+        if (conv.uFlags & 1U << i)
+            *pEnd++ = PRINTF_FLAGS[i];
+    pEnd = std::copy_n("*.*", 3, pEnd);
+    pEnd = std::copy(length.begin(), length.end(), pEnd);
     *pEnd++ = conv.letter;
     *pEnd = '\0';
+}
 
-    out.flush();
-    output_printf(plain, static_cast<int>(conv.iWidth), static_cast<int>(conv.iPrecision), value);
+/// Writes a number by printf. `bGrows`: every step of precision is one more character.
+template <class T> void write_by_printf(text_run& out, const conversion& conv,
+                                        std::string_view length, bool bGrows, T value) {
+    const int64_t iPrecision = std::min(conv.iPrecision, MAX_PRECISION);
+    const int64_t iLeftOut = bGrows ? conv.iPrecision - iPrecision : 0;
+    const int64_t iWidth = std::max<int64_t>(conv.iWidth - iLeftOut, 0);
+    char plain[16];
+    make_plain_conversion(plain, conv, length);
+    char text[MAX_PRINTED_TEXT + 1];
+    const int iLength =
+        std::snprintf(text, sizeof(text), plain, static_cast<int>(std::min(iWidth, MAX_WIDTH)),
+                      static_cast<int>(iPrecision), value);
+    if (is_refused(conv) || iLength < 0 || iLength + iLeftOut > INT_MAX)
+        out.add(UNFORMATTABLE);
+    else
+        out.add({text, std::min(static_cast<size_t>(iLength), MAX_PRINTED_TEXT)});
 }
 
 bool is_signed(char letter) {
@@ -166,18 +163,21 @@ void write_number(text_run& out, const conversion& conv, int64_t iValue) {
 
 } // namespace
 
-void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits) {
-    const int64_t iValue = narrow(uValue, iBits, is_signed(conv.letter));
+void write_integer(text_run& out, const conversion& conv, uint64_t uValue) {
+    const int64_t iValue = narrow(uValue, conv.uBits, is_signed(conv.letter));
     if (conv.letter == 'p')
-        write_by_printf(out, conv, "", reinterpret_cast<void*>(static_cast<uintptr_t>(uValue)));
+        write_by_printf(out, conv, "", uValue != 0, // null is a word
+                        reinterpret_cast<void*>(static_cast<uintptr_t>(uValue)));
     else if (conv.uFlags & CONVERSION_GROUP)
-        write_by_printf(out, conv, "ll", static_cast<long long>(iValue));
+        write_by_printf(out, conv, "ll", true, static_cast<long long>(iValue));
     else
         write_number(out, conv, iValue);
 }
 
 void write_real(text_run& out, const conversion& conv, double value) {
-    write_by_printf(out, conv, "", value);
+    const bool bShortest =
+        (conv.letter == 'g' || conv.letter == 'G') && !(conv.uFlags & CONVERSION_ALTERN);
+    write_by_printf(out, conv, "", std::isfinite(value) && !bShortest, value);
 }
 
 void write_string(text_run& out, const conversion& conv, std::string_view value) {

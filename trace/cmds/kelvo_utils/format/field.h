@@ -1,24 +1,19 @@
 // Writes one value in the field of its conversion: the text that printf gives
-// for width, precision, flags and value, of which the first MAX_FIELD_TEXT
-// characters are kept. Integers, characters and strings are written directly,
-// the rest by output_printf. Main thread only, nothing is allocated.
+// for width, precision, flags and value, of which the first MAX_PRINTED_TEXT
+// characters are kept. Main thread only, nothing is allocated.
 //
-// Widths and precisions may be as large as they like: padding is counted, not
-// made, beyond the characters kept.
+// Widths and precisions may be as large as they like: beyond the characters kept
+// padding is counted, not made.
 #pragma once
 
-#include "bounded_printf.h"
-#include "conversion.h"
+#include "format_plan.h"
 #include "text_run.h"
 
 #include <string_view>
 
-/// Characters kept of one field, as of one text of output_printf.
-inline constexpr size_t MAX_FIELD_TEXT = BOUNDED_PRINTF_SIZE - 1;
-
-/// An integer by "diouxXp". `uValue` holds it in its lowest `iBits` bits (16,
-/// 32 or 64); the letter says whether they are signed.
-void write_integer(text_run& out, const conversion& conv, uint64_t uValue, int iBits);
+/// An integer by "diouxXp". Of `uValue` as many bits count as the conversion asks
+/// for, all of them with "p"; the letter says whether they are signed.
+void write_integer(text_run& out, const conversion& conv, uint64_t uValue);
 
 /// A floating-point number by "eEfgG".
 void write_real(text_run& out, const conversion& conv, double value);

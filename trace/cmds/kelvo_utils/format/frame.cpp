@@ -46,7 +46,10 @@ char* put_time(char* pOut, const prefix_source& source) {
 
 char* put_thread(char* pOut, const prefix_source& source) {
     pOut = put_text(pOut, " T(");
-    pOut = put_hex(pOut, source.threadId, 3);
+    const int iDigits = count_hex_digits(source.threadId);
+    for (int i = 3; i > iDigits; i--)
+        *pOut++ = ' ';
+    pOut = put_hex_digits(pOut, source.threadId, iDigits);
     *pOut++ = ')';
     return pOut;
 }
@@ -64,8 +67,8 @@ char* put_component(char* pOut, const prefix_source& source) {
 }
 
 char* put_function(char* pOut, const prefix_source& source) {
-    *pOut++ = ' ';
-    return put_number(pOut, source.funcId, 10, 2, ' ');
+    pOut = put_text(pOut, source.funcId < 10 ? "  " : " ");
+    return put_decimal(pOut, source.funcId);
 }
 
 char* put_sequence(char* pOut, const prefix_source& source) {
@@ -113,7 +116,7 @@ char* put_fields(char* pOut, const prefix_source& source) {
 }
 
 // Two digits at least.
-char* put_index(char* pOut, uint32_t index) {
+char* put_file_index(char* pOut, uint32_t index) {
     if (index >= 100) [[unlikely]]
         return put_decimal(pOut, index);
     *pOut++ = static_cast<char>('0' + index / 10);
@@ -129,7 +132,7 @@ void write_prefix(const trace_file* pTraceFile, const prefix_source& source) {
     int columns = 0;
     if (anchor.iNumberFiles > 1) {
         *pFields++ = '[';
-        pFields = put_index(pFields, static_cast<uint32_t>(pTraceFile->index));
+        pFields = put_file_index(pFields, static_cast<uint32_t>(pTraceFile->index));
         *pFields++ = ']';
         columns = INDEX_COLUMNS;
     }

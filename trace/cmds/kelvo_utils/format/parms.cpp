@@ -1,8 +1,10 @@
 #include "parms.h"
 
+#include "direct.h"
 #include "packed_parms.h"
 
 #include <algorithm>
+#include <cstring>
 #include <span>
 
 namespace {
@@ -40,6 +42,36 @@ void widen_integer(isv_t& slot, parm_type_t type, int32_t iLength, trace_bytes d
 }
 
 } // namespace
+
+std::string_view parm_string(const parm_ref& parm) {
+    if (parm.uSize == 0)
+        return {};
+    const auto* pText = reinterpret_cast<const char*>(parm.pBytes);
+    return {pText, strnlen(pText, std::min(parm.uSize, parm.uStringLimit))};
+}
+
+parm_value decode_parm(parm_type_t type, const parm_ref& parm, int bAddr64) {
+    const trace_bytes bytes = parm.bytes();
+    const parm_row& row = parm_rows_of(bAddr64)[base_type(type)];
+    switch (base_type(type)) {
+    case PARM_DOUBLE:
+    case PARM_LONGDOUBLE:
+        return {.kind = VALUE_REAL, .real = load<double>(bytes, 0)};
+    case PARM_FLOAT:
+        return {.kind = VALUE_REAL, .real = static_cast<double>(load<float>(bytes, 0))};
+    case PARM_STRING:
+        return {.kind = VALUE_STRING, .string = parm_string(parm)};
+    case PARM_RESOURCE_HANDLE:
+        return {.kind = VALUE_BYTES, .bytes = load_run(bytes, 0, row.uSize)};
+    case PARM_TRACE_ID:
+        return {.kind = VALUE_TRACE_ID, .uInteger = load<uint32_t>(bytes, 0)};
+    case PARM_REST:
+        return {.kind = VALUE_BYTES, .bytes = bytes};
+    default:
+        return {.kind = type & PARM_UNSIGNED ? VALUE_UNSIGNED : VALUE_SIGNED,
+                .uInteger = load_integer(shape_of_integer(type, bAddr64), bytes, 0)};
+    }
+}
 
 bool take_data_block(trace_bytes* pBlocks, trace_bytes* pData) {
     if (!lies_inside(*pBlocks, 0, sizeof(trace_data)))
@@ -80,7 +112,7 @@ void bld_parm_list_unpacked(const format_entry* pFormatEntry, trace_bytes* pBloc
             bytes = std::as_bytes(std::span(pSlot, 1)).first(sizeof(int32_t));
             pSlot++;
         }
-        pList->pParms[i] = {.bytes = bytes, .uStringLimit = static_cast<uint32_t>(data.size())};
+        pList->pParms[i] = make_parm_ref(bytes, data.size());
     }
     pList->numParms = i;
 }

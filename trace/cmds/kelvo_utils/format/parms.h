@@ -1,20 +1,26 @@
-// Parameters of a format: where they lie in the bytes of a record. Main thread
-// only; nothing is allocated.
+// Parameters of a format: where they lie in the bytes of a record, and what they hold.
+// Main thread only; nothing is allocated.
 #pragma once
 
 #include "kelvo.h"
+#include "parm_types.h"
 #include "trace_load.h"
 
-/// Where one parameter lies. Reads go by load(), so a parameter that overruns
-/// its record reads as 0.
+#include <string_view>
+
+/// Where one parameter lies. Trivial, so that a list of them costs nothing to set up.
 struct parm_ref {
-    trace_bytes bytes;     ///< from the parameter's first byte to the end of what may be read
-    uint32_t uStringLimit; ///< a string ends here at the latest, bytes; at its NUL before
+    const std::byte* pBytes; ///< the parameter's first byte
+    uint32_t uSize;          ///< bytes that may be read there
+    uint32_t uStringLimit;   ///< a string ends here at the latest, bytes; at its NUL before
+
+    trace_bytes bytes() const {
+        return {pBytes, uSize};
+    }
 };
 
-/// The base of a type code, without PARM_UNSIGNED.
-constexpr parm_type_t base_type(parm_type_t type) {
-    return type & PARM_BASE_MASK;
+inline parm_ref make_parm_ref(trace_bytes bytes, size_t uStringLimit) {
+    return {bytes.data(), static_cast<uint32_t>(bytes.size()), static_cast<uint32_t>(uStringLimit)};
 }
 
 /// Parameters of one format, found in a record.
@@ -22,6 +28,32 @@ struct parm_list {
     parm_ref pParms[MAX_PARMS];
     int numParms; ///< those from here on are missing
 };
+
+enum value_kind : uint8_t {
+    VALUE_SIGNED,
+    VALUE_UNSIGNED, ///< also of a character
+    VALUE_REAL,
+    VALUE_STRING,
+    VALUE_BYTES, ///< of a resource handle, or the rest of the data
+    VALUE_TRACE_ID,
+};
+
+/// What a parameter holds.
+struct parm_value {
+    value_kind kind;
+    uint64_t uInteger =
+        0; ///< VALUE_SIGNED, VALUE_UNSIGNED, VALUE_TRACE_ID; with its sign in 64 bits
+    double real = 0;
+    std::string_view string{};
+    trace_bytes bytes{};
+};
+
+/// The value of a parameter of type `type`. One that overruns its record is 0.
+/// `bAddr64`: the traced program ran in 64-bit mode.
+parm_value decode_parm(parm_type_t type, const parm_ref& parm, int bAddr64);
+
+/// The string that a parameter holds.
+std::string_view parm_string(const parm_ref& parm);
 
 /// Takes the first block off `*pBlocks`, the bytes from a block's start to the
 /// end of the record, and stores its data. Returns false when there is no

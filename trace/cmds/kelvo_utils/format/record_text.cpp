@@ -2,34 +2,29 @@
 
 #include "digits.h"
 
-#include <charconv>
-
-namespace {
-
-std::string_view text_between(const char* pStart, const char* pEnd) {
-    return {pStart, static_cast<size_t>(pEnd - pStart)};
+void add_hex(text_run& out, uint64_t uValue, int iDigits) {
+    char* const pText = out.begin_room(2 + 16 + 7);
+    pText[0] = '0';
+    pText[1] = 'x';
+    out.end_room(put_hex_digits(pText + 2, uValue, iDigits));
 }
 
-} // namespace
-
-void put_hex(text_run& out, uint64_t uValue, int iDigits) {
-    char text[2 + DIGITS_ROOM] = {'0', 'x'};
-    out.add(text_between(text, put_number(text + 2, uValue, 16, iDigits, '0')));
+void add_decimal(text_run& out, int64_t iValue) {
+    char* pText = out.begin_room(1 + DIGITS_ROOM + 7);
+    if (iValue < 0)
+        *pText++ = '-';
+    const auto uValue = static_cast<uint64_t>(iValue);
+    out.end_room(put_decimal(pText, iValue < 0 ? -uValue : uValue));
 }
 
-void put_decimal(text_run& out, int64_t iValue) {
-    char text[DIGITS_ROOM];
-    out.add(text_between(text, std::to_chars(text, text + sizeof(text), iValue).ptr));
-}
-
-void put_trace_id(text_run& out, uint32_t uTraceId) {
+void add_trace_id(text_run& out, uint32_t uTraceId) {
     out.add("id=");
-    put_hex(out, uTraceId, 8);
+    add_hex(out, uTraceId, 8);
 }
 
-void put_index(text_run& out, size_t uIndex) {
+void add_index(text_run& out, size_t uIndex) {
     out.add('[');
-    put_decimal(out, static_cast<int64_t>(uIndex));
+    add_decimal(out, static_cast<int64_t>(uIndex));
     out.add("]=");
 }
 

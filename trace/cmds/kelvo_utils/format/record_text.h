@@ -6,16 +6,16 @@
 #include <cstdint>
 #include <string_view>
 
-/// "0x" and at least `iDigits` hexadecimal digits.
-void put_hex(text_run& out, uint64_t uValue, int iDigits);
+/// "0x" and the lowest `iDigits` hexadecimal digits, at most 16.
+void add_hex(text_run& out, uint64_t uValue, int iDigits);
 
-void put_decimal(text_run& out, int64_t iValue);
+void add_decimal(text_run& out, int64_t iValue);
 
 /// "id=" and the trace id.
-void put_trace_id(text_run& out, uint32_t uTraceId);
+void add_trace_id(text_run& out, uint32_t uTraceId);
 
 /// "[%d]=" with the position in an array.
-void put_index(text_run& out, size_t uIndex);
+void add_index(text_run& out, size_t uIndex);
 
 /// Writes a string of a record, but not a newline that ends it.
 void format_string(text_run& out, std::string_view string);

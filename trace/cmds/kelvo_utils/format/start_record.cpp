@@ -9,9 +9,9 @@ void write_start(const record_view& record, const format_entry* pFormat) {
 
     text_run out;
     if (!pFormat) {
-        put_trace_id(out, record.uTraceId);
-        put_index(out, 0);
-        put_hex(out, load<uint32_t>(record.bytes, offsetof(trace_record_start, pid)), 8);
+        add_trace_id(out, record.uTraceId);
+        add_index(out, 0);
+        add_hex(out, load<uint32_t>(record.bytes, offsetof(trace_record_start, pid)), 8);
         out.add('\n');
     }
     if (record.pKind->uFunction == TRC_FUNC_RESTART)

@@ -23,7 +23,7 @@ void write_string_array(const record_view& record, const format_entry* pFormat) 
     }
     text_run out;
     if (record.uTraceId != NO_TRACE_ID)
-        put_trace_id(out, record.uTraceId);
+        add_trace_id(out, record.uTraceId);
     out.add(' ');
 
     // As many as the record names, while its bytes last.
@@ -32,7 +32,7 @@ void write_string_array(const record_view& record, const format_entry* pFormat) 
     for (uint32_t i = 0; i < uNumber && uOffset < record.bytes.size(); i++) {
         if (uNumber > 1) {
             out.add('\n');
-            put_index(out, i);
+            add_index(out, i);
         }
         const std::string_view string = load_string(record.bytes, uOffset);
         format_string(out, string);

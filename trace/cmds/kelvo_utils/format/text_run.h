@@ -2,7 +2,8 @@
 // single characters. Main thread only.
 #pragma once
 
-#include "kelvo.h"
+#include "format_plan.h"
+#include "print.h"
 #include "sink.h"
 
 #include <algorithm>
@@ -84,4 +85,27 @@ public:
 private:
     char text[MAX_ROOM]; ///< not set up: a record must not pay for what it does not use
     size_t uLength = 0;
+};
+
+/// A text of which only the first MAX_PRINTED_TEXT characters go out, as of one that
+/// printf writes.
+class kept_text {
+public:
+    explicit kept_text(text_run& run) : out(run) {}
+
+    void add(std::string_view piece) {
+        piece = piece.substr(0, uLeft);
+        out.add(piece);
+        uLeft -= piece.size();
+    }
+
+    void fill(char ch, int64_t iCount) {
+        const size_t uCount = std::min(static_cast<size_t>(iCount), uLeft);
+        out.fill(ch, uCount);
+        uLeft -= uCount;
+    }
+
+private:
+    text_run& out;
+    size_t uLeft = MAX_PRINTED_TEXT;
 };

@@ -28,15 +28,15 @@ void write_values(const record_view& record, const format_entry* pFormat) {
     const uint64_t uFirst = load_value(record.bytes, data.uOffset, data.uElementSize);
 
     text_run out;
-    put_trace_id(out, record.uTraceId);
+    add_trace_id(out, record.uTraceId);
     if (data.uCount == 1) {
         out.add(" val=");
-        put_hex(out, uFirst, iDigits);
+        add_hex(out, uFirst, iDigits);
     } else if (data.uCount == 2) {
         out.add(" val1=");
-        put_hex(out, uFirst, iDigits);
+        add_hex(out, uFirst, iDigits);
         out.add(" val2=");
-        put_hex(out, load_value(record.bytes, data.uOffset + data.uElementSize, data.uElementSize),
+        add_hex(out, load_value(record.bytes, data.uOffset + data.uElementSize, data.uElementSize),
                 iDigits);
     }
     out.add('\n');
@@ -54,11 +54,11 @@ void write_value_array(const record_view& record, const format_entry* pFormat) {
     const size_t uPresent = values.size() / uSize;
 
     text_run out;
-    put_trace_id(out, record.uTraceId);
+    add_trace_id(out, record.uTraceId);
     for (size_t i = 0; i < uPresent; i++) {
         out.add(bLines && i % uPerLine == 0 ? '\n' : ' ');
-        put_index(out, i);
-        put_hex(out, load_value(values, i * uSize, uSize), hex_digits(uSize));
+        add_index(out, i);
+        add_hex(out, load_value(values, i * uSize, uSize), hex_digits(uSize));
     }
     out.add('\n');
 }

@@ -2,10 +2,8 @@
 // the position after what it wrote. Nothing is terminated.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <bit>
-#include <charconv>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -15,18 +13,8 @@ constexpr bool is_digit(char ch) {
     return ch >= '0' && ch <= '9';
 }
 
-/// Room that one call needs when its width is not above 20.
+/// Most decimal digits of a number.
 inline constexpr size_t DIGITS_ROOM = 20;
-
-/// `value` in `base`, lower case, right-aligned in `width` (at most 20) with `pad`.
-inline char* put_number(char* pOut, uint64_t value, int base, int width, char pad) {
-    char digits[DIGITS_ROOM];
-    const char* pEnd = std::to_chars(digits, digits + sizeof digits, value, base).ptr;
-    const std::ptrdiff_t missing = width - (pEnd - digits);
-    if (missing > 0)
-        pOut = std::fill_n(pOut, missing, pad);
-    return std::copy(static_cast<const char*>(digits), pEnd, pOut);
-}
 
 /// The eight hexadecimal digits of `value`, the first one in the lowest byte.
 inline uint64_t hex_digits_of(uint32_t value) {
@@ -125,13 +113,4 @@ inline char* put_decimal(char* pOut, uint64_t value) {
 inline char* put_nanoseconds(char* pOut, uint32_t value) {
     *pOut = static_cast<char>('0' + value / EIGHT_DIGITS);
     return put_eight_digits(pOut + 1, value % EIGHT_DIGITS);
-}
-
-/// `value` in hexadecimal, lower case, right-aligned with blanks in `width`. Up
-/// to seven bytes behind it are written, too.
-inline char* put_hex(char* pOut, uint64_t value, int width) {
-    const int digits = count_hex_digits(value);
-    for (; width > digits; width--)
-        *pOut++ = ' ';
-    return put_hex_digits(pOut, value, digits);
 }

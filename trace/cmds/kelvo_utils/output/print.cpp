@@ -1,23 +1,23 @@
 #include "print.h"
 
-#include "bounded_printf.h"
 #include "handover.h"
 #include "sink.h"
 
 #include <algorithm>
+#include <cstdio>
 #include <string_view>
 
 namespace {
 
-using format_buffer = char[BOUNDED_PRINTF_SIZE];
+using format_buffer = char[MAX_PRINTED_TEXT + 1];
 
 // The formatted text, cut at what the buffer keeps, or the replacement.
 __attribute__((format(printf, 2, 0))) std::string_view
 format_text(format_buffer& buffer, const char* pFormat, va_list args) {
-    const int length = bounded_vsnprintf(buffer, sizeof buffer, pFormat, args);
+    const int length = std::vsnprintf(buffer, sizeof buffer, pFormat, args);
     if (length < 0)
         return UNFORMATTABLE;
-    return {buffer, std::min(static_cast<size_t>(length), sizeof buffer - 1)};
+    return {buffer, std::min(static_cast<size_t>(length), MAX_PRINTED_TEXT)};
 }
 
 } // namespace

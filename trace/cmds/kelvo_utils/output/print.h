@@ -1,9 +1,13 @@
-// printf-style text through the character sink. At most 4095 characters of one
-// call are kept. Main thread only, but for output_message.
+// printf-style text through the character sink. Main thread only, but for
+// output_message.
 #pragma once
 
 #include <cstdarg>
+#include <cstddef>
 #include <string_view>
+
+/// Characters that are kept of one text.
+inline constexpr size_t MAX_PRINTED_TEXT = 4095;
 
 /// Stands in place of a text that cannot be formatted.
 inline constexpr std::string_view UNFORMATTABLE = "kelvo error in output_vprintf()";

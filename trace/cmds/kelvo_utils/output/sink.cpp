@@ -3,8 +3,6 @@
 #include "kelvo.h"
 #include "stdout_stream.h"
 
-#include <algorithm>
-
 namespace {
 
 void indent() {
@@ -17,8 +15,7 @@ void indent() {
 // The prefix is written; the body begins at the column of its thread's level.
 void open_body() {
     const int level = anchor.pCurThread != nullptr ? anchor.pCurThread->nestingLevel : 0;
-    const int column = anchor.headerIndent + 2 * level;
-    anchor.currentIndent = static_cast<int16_t>(std::min<int>(column, MAX_INDENT));
+    anchor.currentIndent = static_cast<int16_t>(anchor.headerIndent + 2 * level);
     indent();
     anchor.outputFlags &= static_cast<uint8_t>(~OUTPUT_START_PENDING);
 }

@@ -3,17 +3,13 @@
 // body and interprets the nesting markers at its start. Main thread only.
 //
 // A body begins at column headerIndent + 2 * nesting level and so does each of
-// its further lines. Columns are signed 16-bit values: a body nested deeper
-// than they reach begins at MAX_INDENT, and a thread's level stops at
-// MAX_NESTING_LEVEL, so that neither ever wraps.
+// its further lines. Columns are signed 16-bit values: a body nested so deeply
+// that its column turns negative is not indented. A thread's level stops at
+// MAX_NESTING_LEVEL.
 #pragma once
 
 #include <cstdint>
 #include <string_view>
-
-/// Rightmost column at which a body begins; leaves room for one held-back
-/// marker character after it.
-inline constexpr int16_t MAX_INDENT = INT16_MAX - 1;
 
 /// Deepest level that is counted.
 inline constexpr uint16_t MAX_NESTING_LEVEL = UINT16_MAX;

@@ -9,10 +9,12 @@
 //
 // The first conversion decides for the whole string whether its parameters are
 // numbered. What is found is collected in arrays of fixed size and moved into
-// one block at the end, so that a refused string leaves nothing behind.
+// one block at the end, so that a refused string leaves nothing behind. Each
+// conversion is taken apart on the way, once and for all.
 #include "compile.h"
 
 #include "digits.h"
+#include "format_plan.h"
 #include "messages.h"
 
 #include <cstdlib>
@@ -25,7 +27,10 @@
 namespace {
 
 constexpr int MAX_NUMBER_DIGITS = 15;
-constexpr std::string_view FLAG_CHARACTERS = "'-+ #0BNJ";
+constexpr std::string_view DROPPED_FLAGS = "BNJ"; // accepted, and mean nothing
+
+/// Widths and precisions stop growing here, far above any int.
+constexpr int64_t MAX_NUMBER = 1'000'000'000'000;
 
 enum class numbering { undecided, sequential, numbered };
 
@@ -35,30 +40,40 @@ constexpr parm_type_t unsigned_of(parm_type_t type) {
     return static_cast<parm_type_t>(type | PARM_UNSIGNED);
 }
 
-/// Conversion letters of one family and the type that each length modifier,
-/// in the order of length_modifier, gives to the parameter.
+/// Conversion letters of one family, what printf reads for them, and the type that each
+/// length modifier, in the order of length_modifier, gives to the parameter.
 struct letter_family {
     std::string_view letters;
+    argument_class argument;
     parm_type_t types[5];
 };
 
-constexpr letter_family every_length(std::string_view letters, parm_type_t type) {
-    return {letters, {type, type, type, type, type}};
+constexpr letter_family every_length(std::string_view letters, argument_class argument,
+                                     parm_type_t type) {
+    return {letters, argument, {type, type, type, type, type}};
 }
 
 constexpr letter_family LETTER_FAMILIES[] = {
-    {"di", {PARM_INT, PARM_SHORT, PARM_LONG, PARM_LONGLONG, PARM_INT}},
+    {"di", ARGUMENT_INTEGER, {PARM_INT, PARM_SHORT, PARM_LONG, PARM_LONGLONG, PARM_INT}},
     {"ouxX",
+     ARGUMENT_INTEGER,
      {unsigned_of(PARM_INT), unsigned_of(PARM_SHORT), unsigned_of(PARM_LONG),
       unsigned_of(PARM_LONGLONG), unsigned_of(PARM_INT)}},
-    {"eEfgG", {PARM_DOUBLE, PARM_FLOAT, PARM_DOUBLE, PARM_DOUBLE, PARM_LONGDOUBLE}},
-    every_length("cC", unsigned_of(PARM_CHAR)),
-    every_length("sS", PARM_STRING),
-    every_length("p", unsigned_of(PARM_LONG)),
-    every_length("r", PARM_RESOURCE_HANDLE),
-    every_length("z", PARM_REST),
-    every_length("T", PARM_TRACE_ID),
+    {"eEfgG", ARGUMENT_REAL, {PARM_DOUBLE, PARM_FLOAT, PARM_DOUBLE, PARM_DOUBLE, PARM_LONGDOUBLE}},
+    every_length("cC", ARGUMENT_CHARACTER, unsigned_of(PARM_CHAR)),
+    every_length("sS", ARGUMENT_STRING, PARM_STRING),
+    every_length("p", ARGUMENT_POINTER, unsigned_of(PARM_LONG)),
+    every_length("r", ARGUMENT_NONE, PARM_RESOURCE_HANDLE),
+    every_length("z", ARGUMENT_NONE, PARM_REST),
+    every_length("T", ARGUMENT_NONE, PARM_TRACE_ID),
 };
+
+/// What a length modifier asks of an integer, in the order of length_modifier, and
+/// the characters of it that printf gets.
+constexpr struct {
+    uint8_t uBits;
+    int iCharacters;
+} INTEGER_LENGTHS[] = {{32, 0}, {16, 1}, {64, 1}, {64, 2}, {32, 0}};
 
 /// The state of one compilation.
 struct format_scan {
@@ -70,12 +85,15 @@ struct format_scan {
     int numConvs;
     parm_type_t parmTypes[MAX_PARMS];
     conv_spec convSpecs[MAX_PARMS];
+    conversion conversions[MAX_PARMS];
 };
 
-/// A '*' width or precision: where it stands, and its parameter.
-struct star_place {
-    size_t uOffset = 0;
-    uint8_t parmNum = NO_PARM;
+/// A width or precision: digits, or where its '*' stands and the parameter of that.
+struct field_size {
+    int64_t iNumber = 0;
+    int iDigits = 0;
+    size_t uStarOffset = 0;
+    uint8_t starParm = NO_PARM;
 };
 
 const char* skip_digits(const char* pText) {
@@ -120,20 +138,60 @@ int take_parm(format_scan& scan) {
     return index;
 }
 
-/// Passes over a '*' with its parameter, or over digits. `pStart` is the
-/// conversion's '%'.
-bool scan_star_or_digits(format_scan& scan, const char* pStart, star_place& star) {
+void scan_flags(format_scan& scan, conversion& conv) {
+    // The NUL at the end of the string is no member of the views.
+    for (;; ++scan.pNext) {
+        const size_t uFlag = PRINTF_FLAGS.find(*scan.pNext);
+        if (uFlag != std::string_view::npos) {
+            conv.uFlags |= static_cast<uint8_t>(1U << uFlag);
+            ++conv.iRebuiltLength;
+        } else if (DROPPED_FLAGS.find(*scan.pNext) == std::string_view::npos) {
+            return;
+        }
+    }
+}
+
+/// Reads a '*' with its parameter, or digits. `pStart` is the conversion's '%'.
+bool scan_size(format_scan& scan, const char* pStart, field_size& size) {
     if (*scan.pNext != '*') {
-        scan.pNext = skip_digits(scan.pNext);
+        for (; is_digit(*scan.pNext); ++scan.pNext, ++size.iDigits)
+            if (size.iNumber < MAX_NUMBER)
+                size.iNumber = size.iNumber * 10 + (*scan.pNext - '0');
         return true;
     }
-    star.uOffset = static_cast<size_t>(scan.pNext - pStart);
+    size.uStarOffset = static_cast<size_t>(scan.pNext - pStart);
     ++scan.pNext;
     const int index = take_parm(scan);
     if (index < 0)
         return false;
     scan.parmTypes[index] = PARM_INT;
-    star.parmNum = static_cast<uint8_t>(index);
+    size.starParm = static_cast<uint8_t>(index);
+    return true;
+}
+
+/// Reads a width and a precision.
+bool scan_sizes(format_scan& scan, const char* pStart, conv_spec& place, conversion& conv) {
+    field_size width;
+    if (!scan_size(scan, pStart, width))
+        return false;
+    field_size precision;
+    const bool bPrecision = *scan.pNext == '.';
+    if (bPrecision) {
+        ++scan.pNext;
+        if (!scan_size(scan, pStart, precision))
+            return false;
+    }
+    // Offsets that are cut here belong to a conversion too long to be recorded.
+    place.widthOffset = static_cast<uint8_t>(width.uStarOffset);
+    place.widthParmNum = width.starParm;
+    place.precOffset = static_cast<uint8_t>(precision.uStarOffset);
+    place.precParmNum = precision.starParm;
+    conv.iWidth = width.iNumber;
+    conv.iRebuiltLength += width.iDigits;
+    if (bPrecision && precision.starParm == NO_PARM) {
+        conv.iPrecision = precision.iNumber;
+        conv.iRebuiltLength += 1 + precision.iDigits;
+    }
     return true;
 }
 
@@ -157,38 +215,24 @@ length_modifier scan_length_modifier(format_scan& scan) {
 }
 
 /// Reads the conversion letter and gives its type to parameter `index`.
-bool scan_letter(format_scan& scan, length_modifier length, int index) {
+bool scan_letter(format_scan& scan, length_modifier length, int index, conversion& conv) {
     const char letter = *scan.pNext;
     for (const letter_family& family : LETTER_FAMILIES) {
         if (family.letters.find(letter) == std::string_view::npos)
             continue;
         scan.parmTypes[index] = family.types[length];
         ++scan.pNext;
+        conv.letter = letter == 'C' ? 'c' : letter == 'S' ? 's' : letter;
+        conv.argument = family.argument;
+        if (conv.argument == ARGUMENT_INTEGER) {
+            conv.uBits = INTEGER_LENGTHS[length].uBits;
+            conv.iRebuiltLength += INTEGER_LENGTHS[length].iCharacters;
+        }
         return true;
     }
     output_err_message("%s: 2625-120 Format error on line %d. Invalid data type %c specified.\n",
                        anchor.pProgName, scan.lineNumber, letter);
     return false;
-}
-
-/// Records a conversion that was read to its letter, if the narrow fields of a
-/// conv_spec can hold it and there is room for one more.
-bool record_conversion(format_scan& scan, const char* pStart, int valueParm, star_place width,
-                       star_place precision) {
-    const auto uOffset = static_cast<size_t>(pStart - scan.pString);
-    const auto uLength = static_cast<size_t>(scan.pNext - pStart);
-    if (scan.numConvs == MAX_PARMS || uOffset > std::numeric_limits<uint16_t>::max() ||
-        uLength > std::numeric_limits<uint8_t>::max())
-        return refuse_unrepresentable(scan);
-    conv_spec& conv = scan.convSpecs[scan.numConvs++];
-    conv.parmNum = static_cast<uint8_t>(valueParm);
-    conv.widthOffset = static_cast<uint8_t>(width.uOffset);
-    conv.widthParmNum = width.parmNum;
-    conv.precOffset = static_cast<uint8_t>(precision.uOffset);
-    conv.precParmNum = precision.parmNum;
-    conv.lenConv = static_cast<uint8_t>(uLength);
-    conv.offset = static_cast<uint16_t>(uOffset);
-    return true;
 }
 
 /// Reads the conversion whose '%' scan.pNext points to. The value takes its
@@ -200,21 +244,27 @@ bool scan_conversion(format_scan& scan) {
     const int valueParm = take_parm(scan);
     if (valueParm < 0)
         return false;
-    // The NUL at the end of the string is no member of the view.
-    while (FLAG_CHARACTERS.find(*scan.pNext) != std::string_view::npos)
-        ++scan.pNext;
-    star_place width;
-    if (!scan_star_or_digits(scan, pStart, width))
+    conv_spec place{};
+    conversion conv;
+    scan_flags(scan, conv);
+    if (!scan_sizes(scan, pStart, place, conv))
         return false;
-    star_place precision;
-    if (*scan.pNext == '.') {
-        ++scan.pNext;
-        if (!scan_star_or_digits(scan, pStart, precision))
-            return false;
-    }
     const length_modifier length = scan_length_modifier(scan);
-    return scan_letter(scan, length, valueParm) &&
-           record_conversion(scan, pStart, valueParm, width, precision);
+    if (!scan_letter(scan, length, valueParm, conv))
+        return false;
+
+    // The narrow fields must hold it, and there must be room for one more.
+    const auto uOffset = static_cast<size_t>(pStart - scan.pString);
+    const auto uLength = static_cast<size_t>(scan.pNext - pStart);
+    if (scan.numConvs == MAX_PARMS || uOffset > std::numeric_limits<uint16_t>::max() ||
+        uLength > std::numeric_limits<uint8_t>::max())
+        return refuse_unrepresentable(scan);
+    place.parmNum = static_cast<uint8_t>(valueParm);
+    place.lenConv = static_cast<uint8_t>(uLength);
+    place.offset = static_cast<uint16_t>(uOffset);
+    scan.convSpecs[scan.numConvs] = place;
+    scan.conversions[scan.numConvs++] = conv;
+    return true;
 }
 
 bool scan_format(format_scan& scan) {
@@ -235,62 +285,27 @@ bool scan_format(format_scan& scan) {
     return true;
 }
 
-/// Copies literal text to `pOut`, a pair of percent signs as one; returns the end.
-char* copy_literal(char* pOut, std::string_view text) {
-    for (size_t i = 0; i < text.size(); ++i) {
-        *pOut++ = text[i];
-        if (text[i] == '%')
-            ++i;
-    }
-    return pOut;
-}
-
-/// Fills the entry's pieces; their text goes to `pText`.
-void lay_out_pieces(format_entry& entry, char* pText) {
-    const char* pCursor = entry.pString;
-    for (int i = 0; i <= entry.numConvs; ++i) {
-        const bool bLast = i == entry.numConvs;
-        const char* const pEnd =
-            bLast ? pCursor + std::strlen(pCursor) : entry.pString + entry.pConvSpecs[i].offset;
-        std::string_view literal(pCursor, static_cast<size_t>(pEnd - pCursor));
-        if (bLast && literal.ends_with('\n'))
-            literal.remove_suffix(1); // every text is ended with a newline of its own
-        char* const pTextEnd = copy_literal(pText, literal);
-        entry.pPieces[i] = format_piece{};
-        entry.pPieces[i].pText = pText;
-        entry.pPieces[i].uLength = static_cast<uint32_t>(pTextEnd - pText);
-        pText = pTextEnd;
-        if (!bLast)
-            pCursor = pEnd + entry.pConvSpecs[i].lenConv;
-    }
-}
-
-bool uses_parms_in_order(const format_entry& entry) {
-    for (int i = 0; i < entry.numConvs; ++i) {
-        const conv_spec& place = entry.pConvSpecs[i];
-        if (place.parmNum != i || place.widthParmNum != NO_PARM || place.precParmNum != NO_PARM)
-            return false;
-    }
-    return entry.numConvs == entry.numParms;
-}
-
 constexpr size_t round_up(size_t uValue, size_t uMultiple) {
     return (uValue + uMultiple - 1) / uMultiple * uMultiple;
 }
 
 /// Moves what was found into one block: the entry, its conversions, its type
-/// codes, its string, its pieces and their text. Null when memory is exhausted.
+/// codes, its string, and its plan with its parts. Null when memory is exhausted.
 format_entry* make_entry(const format_scan& scan) {
     static_assert(sizeof(format_entry) % alignof(conv_spec) == 0);
     static_assert(sizeof(parm_type_t) == 1);
+    static_assert(alignof(format_plan) >= alignof(format_piece));
+    static_assert(alignof(format_piece) >= alignof(conversion));
     const auto uConvs = static_cast<size_t>(scan.numConvs);
     const auto uParms = static_cast<size_t>(scan.numParms);
     const size_t uStringSize = std::strlen(scan.pString) + 1;
     const size_t uConvsAt = sizeof(format_entry);
     const size_t uTypesAt = uConvsAt + uConvs * sizeof(conv_spec);
     const size_t uStringAt = uTypesAt + uParms;
-    const size_t uPiecesAt = round_up(uStringAt + uStringSize, alignof(format_piece));
-    const size_t uTextAt = uPiecesAt + (uConvs + 1) * sizeof(format_piece);
+    const size_t uPlanAt = round_up(uStringAt + uStringSize, alignof(format_plan));
+    const size_t uPiecesAt = uPlanAt + sizeof(format_plan); // every record needs these two
+    const size_t uConversionsAt = uPiecesAt + (uConvs + 1) * sizeof(format_piece);
+    const size_t uTextAt = uConversionsAt + uConvs * sizeof(conversion);
 
     auto* const pBlock = static_cast<std::byte*>(std::malloc(uTextAt + uStringSize + PADDED_TEXT));
     if (pBlock == nullptr)
@@ -306,10 +321,12 @@ format_entry* make_entry(const format_scan& scan) {
     std::uninitialized_copy_n(scan.parmTypes, uParms, pEntry->pParmTypes);
     pEntry->pString = reinterpret_cast<char*>(pBlock + uStringAt);
     std::memcpy(pEntry->pString, scan.pString, uStringSize);
-    pEntry->pPieces = reinterpret_cast<format_piece*>(pBlock + uPiecesAt);
-    lay_out_pieces(*pEntry, reinterpret_cast<char*>(pBlock + uTextAt));
+    pEntry->pPlan = new (pBlock + uPlanAt) format_plan{};
+    pEntry->pPlan->pConversions = reinterpret_cast<conversion*>(pBlock + uConversionsAt);
+    std::uninitialized_copy_n(scan.conversions, uConvs, pEntry->pPlan->pConversions);
+    pEntry->pPlan->pPieces = reinterpret_cast<format_piece*>(pBlock + uPiecesAt);
+    lay_out_plan(*pEntry, reinterpret_cast<char*>(pBlock + uTextAt));
     std::memset(pBlock + uTextAt + uStringSize, 0, PADDED_TEXT);
-    pEntry->bParmsInOrder = uses_parms_in_order(*pEntry);
     return pEntry;
 }
 

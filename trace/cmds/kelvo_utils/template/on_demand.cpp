@@ -27,9 +27,9 @@ int read_first_on_path(template_file* pTemplate, int* p_insufficient_resources) 
         file_name_text name;
         if (!build_template_file_name(directory, pTemplate->compId, &name))
             continue;
-        const file_owner pFile = open_template_file(name.text);
-        if (pFile != nullptr)
-            return read_template(pTemplate, name.text, pFile.get(), p_insufficient_resources);
+        const int iResult = read_template_file(pTemplate, name.text, p_insufficient_resources);
+        if (iResult >= 0)
+            return iResult;
     }
     return 0;
 }

@@ -105,10 +105,8 @@ void template_file_init_walk_action(const void* pNode, VISIT visit, int /*depth*
     pTemplate->pFormats = nullptr;
     if (pTemplate->preload_path == nullptr)
         return;
-    const file_owner pFile = open_template_file(pTemplate->preload_path);
     int insufficient_resources = 0;
-    if (pFile != nullptr && read_template(pTemplate, pTemplate->preload_path, pFile.get(),
-                                          &insufficient_resources) != 0)
+    if (read_template_file(pTemplate, pTemplate->preload_path, &insufficient_resources) > 0)
         release_formats(pTemplate);
 }
 

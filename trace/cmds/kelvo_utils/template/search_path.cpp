@@ -1,8 +1,6 @@
 #include "search_path.h"
 
 #include <cstring>
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -89,18 +87,4 @@ bool build_template_file_name(std::string_view directory, const char* compId,
     // around the directory, and only a regular file is ever read.
     const std::string_view component(compId, strnlen(compId, sizeof(template_file::compId)));
     return pName->append_slash() && pName->append(component) && pName->append(TEMPLATE_SUFFIX);
-}
-
-file_owner open_template_file(const char* pFileName) {
-    const int fd = open(pFileName, O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
-    if (fd < 0)
-        return nullptr;
-    struct stat status;
-    FILE* pFile = nullptr;
-    if (fstat(fd, &status) == 0 && S_ISREG(status.st_mode) &&
-        status.st_size <= MAX_TEMPLATE_FILE_SIZE)
-        pFile = fdopen(fd, "r");
-    if (pFile == nullptr)
-        close(fd);
-    return file_owner(pFile);
 }

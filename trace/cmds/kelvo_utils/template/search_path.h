@@ -1,12 +1,9 @@
-// The template search path: its directories, and the files in them.
+// The template search path: its directories, and the names of the files in them.
 #pragma once
 
 #include "kelvo.h"
 
-#include <cstdio>
-#include <memory>
 #include <string_view>
-#include <sys/types.h>
 
 /// Room for the name of a template file, with its NUL.
 inline constexpr size_t FILE_NAME_ROOM = 4096;
@@ -23,13 +20,6 @@ struct file_name_text {
     bool append_slash();
 };
 
-struct file_closer {
-    void operator()(FILE* pFile) const {
-        std::fclose(pFile);
-    }
-};
-using file_owner = std::unique_ptr<FILE, file_closer>;
-
 /// Takes the first directory off `*pPath`. It may be empty (the current working
 /// directory). False when nothing is left.
 bool take_first_directory(std::string_view* pPath, std::string_view* pDirectory);
@@ -43,11 +33,3 @@ bool take_last_directory(std::string_view* pPath, std::string_view* pDirectory);
 /// long, or the current working directory is needed and cannot be determined.
 bool build_template_file_name(std::string_view directory, const char* compId,
                               file_name_text* pName);
-
-/// A larger file is no template file: reading it would only hold the run up.
-inline constexpr off_t MAX_TEMPLATE_FILE_SIZE = off_t{256} * 1024 * 1024;
-
-/// Opens a template file for reading; null when it cannot be opened, is not a
-/// regular file (opening a FIFO or a device must not hang the run) or is larger
-/// than MAX_TEMPLATE_FILE_SIZE.
-file_owner open_template_file(const char* pFileName);

@@ -21,12 +21,6 @@ format_entry* get_format_from_file(trace_file* /*pTraceFile*/, const char* compI
     return pTemplate != nullptr ? find_format(pTemplate, trace_id, block_id) : nullptr;
 }
 
-bool template_is_loaded(const char* compId) {
-    return trace_template_files_were_preloaded ||
-           std::string_view(compId, sizeof(template_file::compId)) == INTERNAL_COMPONENT ||
-           find_loaded_template(compId) != nullptr;
-}
-
 void free_template_info() {
     if (trace_template_files_were_preloaded)
         free_preloaded_templates();

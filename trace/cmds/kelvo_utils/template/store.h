@@ -10,10 +10,6 @@
 format_entry* get_format_from_file(trace_file* pTraceFile, const char* compId, uint32_t trace_id,
                                    int block_id, int* p_insufficient_resources);
 
-/// Whether the component's template is there to be asked. It is not after a
-/// lookup whose file was refused: the next lookup reads that file again.
-bool template_is_loaded(const char* compId);
-
 /// Searches the path for the component's file, reads it and puts the template
 /// at the head of the on-demand list. Returns it (perhaps empty), or null when
 /// the file was refused or memory ran out (then the flag is 1).

@@ -31,10 +31,22 @@ using template_owner = std::unique_ptr<template_file, template_releaser>;
 /// (4 characters), or null when memory is exhausted.
 template_owner make_template(const char* compId);
 
+struct file_closer {
+    void operator()(FILE* pFile) const {
+        std::fclose(pFile);
+    }
+};
+using file_owner = std::unique_ptr<FILE, file_closer>;
+
 /// Parses `pFile` into the template and indexes what it holds. Result and flag
 /// are those of parse_template_file; the caller closes `pFile`.
 int read_template(template_file* pTemplate, const char* pFileName, FILE* pFile,
                   int* p_insufficient_resources);
+
+/// The same for the file of a name. Returns -1 when that cannot be opened. What is no
+/// regular file counts as empty: reading a FIFO or a device could hang the run.
+int read_template_file(template_file* pTemplate, const char* pFileName,
+                       int* p_insufficient_resources);
 
 /// The newest entry with this trace id, whatever its block id, or null.
 format_entry* find_newest_format(const template_file* pTemplate, int32_t trace_id);
