@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -56,6 +57,28 @@ trace_file_header make_header(const trace_writer_options& options) {
     return header;
 }
 
+/// Makes the empty file as long as it will be; not by sparse bytes if that can
+/// be helped. Returns 0 or an errno value.
+int set_size(int fd, const trace_writer_options& options) {
+    rlimit limit{};
+    if (getrlimit(RLIMIT_FSIZE, &limit) == 0 && options.uFileSize > limit.rlim_cur)
+        return EFBIG; // the call itself would send SIGXFSZ
+    if (ftruncate(fd, options.uFileSize) != 0)
+        return errno;
+    // In pieces: a call that a signal interrupts begins again.
+    constexpr off_t PIECE = 8 << 20;
+    for (off_t iAt = 0; options.bReserveSpace && iAt < options.uFileSize;) {
+        const off_t iSize = std::min<off_t>(PIECE, options.uFileSize - iAt);
+        const int error = posix_fallocate(fd, iAt, iSize);
+        if (error == EOPNOTSUPP || error == EINVAL || error == ENOSYS)
+            break; // the file system can do neither this nor what stands in for it
+        if (error != 0 && error != EINTR)
+            return error;
+        iAt += error == 0 ? iSize : 0;
+    }
+    return 0;
+}
+
 } // namespace
 
 trace_writer::~trace_writer() {
@@ -88,14 +111,11 @@ trace_writer_status trace_writer::make_file(const char* pPath,
     if (unlink(pPath) != 0 && errno != ENOENT)
         return TRACE_WRITER_SYSTEM;
     fd = open(pPath, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, options.uMode);
-    if (fd < 0 || ftruncate(fd, options.uFileSize) != 0)
+    if (fd < 0)
         return TRACE_WRITER_SYSTEM;
-    if (options.bReserveSpace) {
-        const int error = posix_fallocate(fd, 0, options.uFileSize);
-        if (error != 0) {
-            errno = error;
-            return TRACE_WRITER_SYSTEM;
-        }
+    if (const int error = set_size(fd, options); error != 0) {
+        errno = error;
+        return TRACE_WRITER_SYSTEM;
     }
     void* const pAddress =
         mmap(nullptr, options.uFileSize, PROT_READ | PROT_WRITE, MAP_SHARED, fd, 0);

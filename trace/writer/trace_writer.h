@@ -55,6 +55,16 @@
 //    bForgetDeadReaders.)
 // 5. A closed file has bit 15 set, so a reader's wait is short. A file whose
 //    writer was killed at any point is a sound ring too.
+//
+// THE SPACE. A store into a mapped page for which the disk has no room ends the
+// process with SIGBUS. So create takes all space of the file at once, and when
+// the disk (or a quota, or the process's limit of file sizes) does not allow it,
+// create fails with TRACE_WRITER_SYSTEM and errno ENOSPC, EDQUOT or EFBIG, and
+// leaves no file: the program goes on untraced. A file of that name is gone by
+// then; its space may be what the new one needs. Where the file system cannot
+// reserve, each block is written once; where even that is refused, and with
+// bReserveSpace false, the file is sparse and the risk stays. A file system that
+// writes every change to a new place (copy on write) may break the reservation.
 #pragma once
 
 #include "trace_file_fmt.h"
@@ -99,7 +109,7 @@ struct trace_writer_options {
 
     uint32_t uFirstSeqNumber = 2;   ///< number of the first record; even
     unsigned uMode = 0644;          ///< permissions of the new file, before the umask
-    bool bReserveSpace = false;     ///< allocate all blocks now: a full disk shows here, not later
+    bool bReserveSpace = true;      ///< take the file's space from the disk now; see THE SPACE
     bool bForgetDeadReaders = true; ///< false when the reader is a thread of this process
 };
 
