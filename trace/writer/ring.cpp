@@ -12,15 +12,15 @@ namespace {
 constexpr uint32_t MIN_RECORD = sizeof(trace_record_header);
 
 bool function_is_valid(uint16_t function) {
-    return (function >= TRC_FUNC_ID && function <= TRC_FUNC_TIME_CALIBRATION) ||
-           function == TRC_FUNC_RESTART || function == TRC_FUNC_DISCARDED;
+    return function != TRC_FUNC_FILLER && trc_kind_is_valid(function);
 }
 
 bool origin_is_valid(uint16_t function, const trace_origin& origin) {
     if (origin.compId.size() != sizeof(trace_record_header::compId))
         return false;
-    return function > TRC_FUNC_START || std::all_of(origin.compId.begin(), origin.compId.end(),
-                                                    [](char c) { return c >= 0x20 && c <= 0x7E; });
+    return !trc_kind_has_component(function) ||
+           std::all_of(origin.compId.begin(), origin.compId.end(),
+                       [](char c) { return c >= 0x20 && c <= 0x7E; });
 }
 
 trace_record_header make_header(uint16_t function, const trace_origin& origin, uint32_t uLength) {

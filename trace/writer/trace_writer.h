@@ -114,7 +114,7 @@ struct trace_writer_options {
 };
 
 /// Where and when a record was written. compId: four characters, printable for
-/// kinds 1 to 16. timeStamp is raw, in the file's time base.
+/// kinds with TRC_KIND_COMPONENT. timeStamp is raw, in the file's time base.
 struct trace_origin {
     std::string_view compId;
     uint32_t threadId = 0;
@@ -179,7 +179,7 @@ public:
     // or a negative status.
 
     /// Any kind from its body: the bytes that follow the record header.
-    /// `function` must be valid in a file: 1 to 17, 19 or 0xFFFE.
+    /// `function` must be a kind with TRC_KIND_VALID, and no filler.
     trace_writer_status append(uint16_t function, const trace_origin& origin, trace_bytes body);
     /// The same, the body being the concatenation of `parts`.
     trace_writer_status append(uint16_t function, const trace_origin& origin,
