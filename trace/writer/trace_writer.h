@@ -139,6 +139,11 @@ struct trace_error_content {
     std::span<const cu_error_arg_t> args;
 };
 
+/// The bytes of a record behind its header.
+template <class RECORD> trace_bytes trace_body_of(const RECORD& record) {
+    return std::as_bytes(std::span(&record, 1)).subspan(sizeof(trace_record_header));
+}
+
 /// What a writer has done so far.
 struct trace_writer_counts {
     uint64_t uAppended = 0; ///< records written, those of kind 0xFFFE included
@@ -185,23 +190,59 @@ public:
     trace_writer_status append(uint16_t function, const trace_origin& origin,
                                std::initializer_list<trace_bytes> parts);
 
-    trace_writer_status append_id(const trace_origin& origin, uint32_t traceId);
+    trace_writer_status append_id(const trace_origin& origin, uint32_t traceId) {
+        return append_fields<trace_record_id>(TRC_FUNC_ID, origin, traceId);
+    }
+    trace_writer_status append_int32(const trace_origin& origin, uint32_t traceId, int32_t value) {
+        return append_fields<trace_record_int32>(TRC_FUNC_INT32, origin, traceId, value);
+    }
+    trace_writer_status append_int32_2(const trace_origin& origin, uint32_t traceId, int32_t value1,
+                                       int32_t value2) {
+        return append_fields<trace_record_int32_2>(TRC_FUNC_INT32_2, origin, traceId, value1,
+                                                   value2);
+    }
+    trace_writer_status append_uint32(const trace_origin& origin, uint32_t traceId,
+                                      uint32_t value) {
+        return append_fields<trace_record_uint32>(TRC_FUNC_UINT32, origin, traceId, value);
+    }
+    trace_writer_status append_uint32_2(const trace_origin& origin, uint32_t traceId,
+                                        uint32_t value1, uint32_t value2) {
+        return append_fields<trace_record_uint32_2>(TRC_FUNC_UINT32_2, origin, traceId, value1,
+                                                    value2);
+    }
+    trace_writer_status append_int64(const trace_origin& origin, uint32_t traceId, int64_t value) {
+        return append_fields<trace_record_int64>(TRC_FUNC_INT64, origin, traceId, value);
+    }
+    trace_writer_status append_int64_2(const trace_origin& origin, uint32_t traceId, int64_t value1,
+                                       int64_t value2) {
+        return append_fields<trace_record_int64_2>(TRC_FUNC_INT64_2, origin, traceId, value1,
+                                                   value2);
+    }
+    trace_writer_status append_uint64(const trace_origin& origin, uint32_t traceId,
+                                      uint64_t value) {
+        return append_fields<trace_record_uint64>(TRC_FUNC_UINT64, origin, traceId, value);
+    }
+    trace_writer_status append_uint64_2(const trace_origin& origin, uint32_t traceId,
+                                        uint64_t value1, uint64_t value2) {
+        return append_fields<trace_record_uint64_2>(TRC_FUNC_UINT64_2, origin, traceId, value1,
+                                                    value2);
+    }
+    trace_writer_status append_start(const trace_origin& origin, uint32_t traceId, uint32_t pid,
+                                     const cu_timeinfo& timeInfo) {
+        return append_fields<trace_record_start>(TRC_FUNC_START, origin, traceId, pid, timeInfo);
+    }
+    trace_writer_status append_time_calibration(const trace_origin& origin,
+                                                const cu_timeinfo& reBase) {
+        return append_fields<time_calibration>(TRC_FUNC_TIME_CALIBRATION, origin, reBase);
+    }
+    trace_writer_status append_discarded(const trace_origin& origin) {
+        return append(TRC_FUNC_DISCARDED, origin, trace_bytes());
+    }
+
     /// The text is written up to its first NUL, and a NUL added.
     trace_writer_status append_string(const trace_origin& origin, std::string_view text);
     trace_writer_status append_data(const trace_origin& origin, uint32_t traceId,
                                     std::span<const trace_bytes> blocks);
-    trace_writer_status append_int32(const trace_origin& origin, uint32_t traceId, int32_t value);
-    trace_writer_status append_int32_2(const trace_origin& origin, uint32_t traceId, int32_t value1,
-                                       int32_t value2);
-    trace_writer_status append_uint32(const trace_origin& origin, uint32_t traceId, uint32_t value);
-    trace_writer_status append_uint32_2(const trace_origin& origin, uint32_t traceId,
-                                        uint32_t value1, uint32_t value2);
-    trace_writer_status append_int64(const trace_origin& origin, uint32_t traceId, int64_t value);
-    trace_writer_status append_int64_2(const trace_origin& origin, uint32_t traceId, int64_t value1,
-                                       int64_t value2);
-    trace_writer_status append_uint64(const trace_origin& origin, uint32_t traceId, uint64_t value);
-    trace_writer_status append_uint64_2(const trace_origin& origin, uint32_t traceId,
-                                        uint64_t value1, uint64_t value2);
     trace_writer_status append_values(const trace_origin& origin, uint32_t traceId,
                                       std::span<const uint32_t> values);
     trace_writer_status append_values64(const trace_origin& origin, uint32_t traceId,
@@ -209,13 +250,8 @@ public:
     trace_writer_status append_error(const trace_origin& origin, const trace_error_content& error);
     trace_writer_status append_strings(const trace_origin& origin, uint32_t traceId,
                                        std::span<const std::string_view> strings);
-    trace_writer_status append_start(const trace_origin& origin, uint32_t traceId, uint32_t pid,
-                                     const cu_timeinfo& timeInfo);
-    trace_writer_status append_time_calibration(const trace_origin& origin,
-                                                const cu_timeinfo& reBase);
     trace_writer_status append_restart(const trace_origin& origin, uint32_t traceId, uint32_t pid,
                                        const cu_timeinfo& timeInfo, std::string_view text);
-    trace_writer_status append_discarded(const trace_origin& origin);
 
     /// Longest record, header included, that the area can take.
     uint32_t max_record_length() const;
@@ -273,9 +309,15 @@ private:
     void store_filler(uint32_t uAt, uint32_t uLength);
     void swallow_first_filler();
 
-    // append.cpp: the bodies
-    template <class... T> trace_writer_status
-    append_fields(uint16_t function, const trace_origin& origin, const T&... fields);
+    /// A kind whose body is a row of fields, as the struct of the kind says.
+    template <class RECORD, class... FIELD> trace_writer_status
+    append_fields(uint16_t function, const trace_origin& origin, const FIELD&... fields) {
+        return append(function, origin, trace_body_of(RECORD{{}, fields...}));
+    }
+
+    // append.cpp: the other bodies
+    template <class FILL> trace_writer_status
+    append_filled(uint16_t function, const trace_origin& origin, size_t bodySize, const FILL& fill);
 
     // live.cpp: requests of a reader, and readers that died
     void answer_reader();
