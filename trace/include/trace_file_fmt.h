@@ -210,7 +210,8 @@ struct [[gnu::packed]] trace_record_header {
     uint32_t threadId;  ///< writing thread
     uint64_t timeStamp; ///< raw; see cu_cvt_time_platform_1
 };
-static_assert(sizeof(trace_record_header) == 28);
+inline constexpr uint32_t TRC_MIN_RECORD = 28; ///< no record is shorter
+static_assert(sizeof(trace_record_header) == TRC_MIN_RECORD);
 static_assert(offsetof(trace_record_header, length) == 0);
 static_assert(offsetof(trace_record_header, function) == 4);
 static_assert(offsetof(trace_record_header, reserved) == 6);

@@ -2,7 +2,7 @@
 // ring, closing it.
 #include "trace_writer.h"
 
-#include "writer_words.h"
+#include "shared_words.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -14,9 +14,8 @@
 
 namespace {
 
-constexpr uint32_t MIN_RECORD = sizeof(trace_record_header);
 /// A gap, and the shortest record or the last filler of an empty ring.
-constexpr uint32_t MIN_AREA = 2 * MIN_RECORD;
+constexpr uint32_t MIN_AREA = 2 * TRC_MIN_RECORD;
 /// The header fields that both sides of the protocol use end here.
 constexpr uint32_t MIN_OFFSET = offsetof(trace_file_header, program);
 
@@ -142,13 +141,12 @@ void trace_writer::lay_out_file(const trace_writer_options& options) {
     const trace_file_header header = make_header(options);
     std::memcpy(pMap, &header, std::min<size_t>(sizeof(header), uArea));
     bFirstFiller = true;
-    uGapEnd = uSize - MIN_RECORD;
-    store_filler(uGapEnd, MIN_RECORD);
-    shared_word_of(pMap, uGapEnd, WORD_SEQ_NUMBER).store(uNextSeq, std::memory_order_relaxed);
+    uGapEnd = uSize - TRC_MIN_RECORD;
+    store_filler(uGapEnd, TRC_MIN_RECORD);
+    store_header_word(pMap + uGapEnd, WORD_SEQ_NUMBER, uNextSeq);
     store_filler(uWrite, uGapEnd - uWrite);
     // Only now is it a trace file to anybody who opens it.
-    shared<uint32_t>(pMap, offsetof(trace_file_header, uActualFileSize))
-        .store(uSize, std::memory_order_release);
+    store_actual_file_size(file_header(), uSize);
 }
 
 void trace_writer::close() {
@@ -161,7 +159,7 @@ void trace_writer::close() {
     }
     if (bHolding)
         publish_held();
-    shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK, std::memory_order_release);
+    acknowledge_tail_request(file_header());
     munmap(pMap, uSize);
     pMap = nullptr;
     uSize = 0;
@@ -170,5 +168,5 @@ void trace_writer::close() {
 }
 
 uint32_t trace_writer::max_record_length() const {
-    return pMap == nullptr ? 0 : uSize - uArea - MIN_RECORD;
+    return pMap == nullptr ? 0 : uSize - uArea - TRC_MIN_RECORD;
 }

@@ -287,6 +287,14 @@ private:
         uint32_t uGivenUp = 0; ///< records swallowed
     };
 
+    trace_file_header* file_header() const {
+        return reinterpret_cast<trace_file_header*>(pMap);
+    }
+    /// Plain copy of a record's header; only the writer changes headers.
+    trace_record_header header_at(uint32_t uAt) const {
+        return load<trace_record_header>({pMap, uSize}, uAt);
+    }
+
     // trace_writer.cpp: the file
     trace_writer_status make_file(const char* pPath, const trace_writer_options& options);
     void lay_out_file(const trace_writer_options& options);
