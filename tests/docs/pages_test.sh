@@ -113,6 +113,15 @@ same "option of kelvo_sample" "$sample" \
     "$(sed -nE 's/^\.It Fl ([a-z])( Ar [a-z]+)? , Fl -([a-z-]+)( Ns = .*)?$/\3 \1/p
                s/^\.It Fl -([a-z-]+)( Ns = .*)?$/\1 /p' docs/kelvo_sample.1)"
 
+# ------------------------------------------------------------ the writer library
+
+writer=trace/writer/trace_writer.h
+same "kind to append" "$writer" \
+    "$(sed -nE 's/^    trace_writer_status (append_[a-z0-9_]+)\(const trace_origin.*/\1/p' $writer)" \
+    "docs/trace_writer.3" "$(sed -nE 's/^\.It Fn (append_[a-z0-9_]+).*/\1/p' docs/trace_writer.3)"
+same "status" "$writer" "$(sed -nE 's/^    (TRACE_WRITER_[A-Z_]+) = .*/\1/p' $writer)" \
+    "docs/trace_writer.3" "$(sed -nE 's/^\.It Dv ([A-Z_]+)$/\1/p' docs/trace_writer.3)"
+
 # ------------------------------------------------------------- the file format
 
 format=trace/include/trace_file_fmt.h
@@ -139,6 +148,6 @@ same "conversion letter" "$compiler" \
 
 while read -r name section; do
     [ -e "docs/$name.$section" ] || fail "reference to $name($section), which is no page"
-done < <(sed -nE 's/^\.Xr (kelvo[a-z_-]*) ([1-9]).*/\1 \2/p' docs/*.[1-9] | sort -u)
+done < <(sed -nE 's/^\.Xr ((kelvo|trace_)[a-z_-]*) ([1-9]).*/\1 \3/p' docs/*.[1-9] | sort -u)
 
 finish "The pages and completions agree with the sources."

@@ -67,6 +67,7 @@
 // writes every change to a new place (copy on write) may break the reservation.
 #pragma once
 
+#include "trace_clock.h"
 #include "trace_file_fmt.h"
 #include "trace_load.h"
 
@@ -120,6 +121,13 @@ struct trace_origin {
     uint32_t threadId = 0;
     uint64_t timeStamp = 0;
 };
+
+/// The origin of a record of the calling thread, now; the file's timeInfo is
+/// that of trace_time_base(). With several threads call it under their lock, so
+/// that the times of the file rise.
+inline trace_origin trace_here(std::string_view compId) {
+    return {compId, trace_thread_id(), trace_now()};
+}
 
 /// The content of an error record. Texts with a null data() are absent;
 /// funcName and fileName are always written. Arguments of type
