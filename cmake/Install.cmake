@@ -4,7 +4,7 @@
 
 install(DIRECTORY trace/include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kelvo COMPONENT dev
         FILES_MATCHING PATTERN "*.h")
-install(FILES trace/writer/trace_writer.h
+install(FILES trace/writer/trace_clock.h trace/writer/trace_writer.h
         DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kelvo COMPONENT dev)
 install(TARGETS trace_writer kv_cu ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT dev)
 

@@ -180,8 +180,9 @@ walk_result step(trace_file* pTraceFile, trace_record_header* pHeader) {
 }
 
 bool is_taken(const reading& run, const trace_record_header& header) {
-    return is_for_output(header) ? start_is_reached(run.pTraceFile, header)
-                                 : run.options.bEveryKind && header.function != TRC_FUNC_FILLER;
+    return trc_kind_is_output(header.function)
+               ? start_is_reached(run.pTraceFile, header)
+               : run.options.bEveryKind && header.function != TRC_FUNC_FILLER;
 }
 
 hostile_end walk(reading& run) {

@@ -3,29 +3,23 @@
 
 #include "raw_trace.h"
 
+#include <algorithm>
+#include <array>
 #include <span>
 #include <vector>
 
 /// Every kind that a sound file may hold.
-inline constexpr uint16_t SAMPLE_KINDS[] = {TRC_FUNC_ID,
-                                            TRC_FUNC_STRING,
-                                            TRC_FUNC_DATA,
-                                            TRC_FUNC_INT32,
-                                            TRC_FUNC_INT32_2,
-                                            TRC_FUNC_UINT32,
-                                            TRC_FUNC_UINT32_2,
-                                            TRC_FUNC_INT64,
-                                            TRC_FUNC_INT64_2,
-                                            TRC_FUNC_UINT64,
-                                            TRC_FUNC_UINT64_2,
-                                            TRC_FUNC_VALUES,
-                                            TRC_FUNC_VALUES64,
-                                            TRC_FUNC_ERROR,
-                                            TRC_FUNC_STRINGS,
-                                            TRC_FUNC_START,
-                                            TRC_FUNC_TIME_CALIBRATION,
-                                            TRC_FUNC_RESTART,
-                                            TRC_FUNC_DISCARDED};
+inline constexpr auto SAMPLE_KINDS = [] {
+    constexpr auto is_record = [](const trc_kind& kind) {
+        return kind.function != TRC_FUNC_FILLER && trc_kind_is_valid(kind.function);
+    };
+    std::array<uint16_t, std::ranges::count_if(TRC_KINDS, is_record)> kinds{};
+    size_t uNext = 0;
+    for (const trc_kind& kind : TRC_KINDS)
+        if (is_record(kind))
+            kinds[uNext++] = kind.function;
+    return kinds;
+}();
 
 /// A body for a record of the kind, with every part that the kind can have; its
 /// trace id is the kind's code.

@@ -1,12 +1,12 @@
 #!/usr/bin/env bash
 # Asks the bash completion what it offers, and lets the other shells, as far as
 # they are installed, read their files.
-# Usage: completions_test.sh ROOT
+# Usage: completions_test.sh DIRECTORY      (of the completions that were built)
 
 set -euo pipefail
 # shellcheck source=tests/docs/failures.sh
 . "$(dirname -- "$0")/failures.sh"
-completions=$1/completions
+completions=$1
 
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
@@ -14,8 +14,13 @@ cd "$work"
 mkdir -p dirs/alpha dirs/beta
 touch a.trc
 
-# shellcheck disable=SC1091  # it is checked by itself
-. "$completions/kelvo.bash"
+for command in kelvo kelvo_sample; do
+    # shellcheck disable=SC1090  # it is checked by itself
+    . "$completions/$command.bash"
+    if command -v shellcheck >/dev/null; then
+        shellcheck "$completions/$command.bash" || fail "shellcheck found something"
+    fi
+done
 
 # offers "WORDS" EXPECTED...: what is offered for the last word.
 offers() {
@@ -26,7 +31,7 @@ offers() {
     [[ $line != *' ' ]] || COMP_WORDS+=('')
     COMP_CWORD=$((${#COMP_WORDS[@]} - 1))
     COMPREPLY=()
-    _kelvo || true
+    "_${COMP_WORDS[0]}" || true
     offered=$(printf '%s\n' "${COMPREPLY[@]}" | sort)
     [ "$offered" = "$expected" ] ||
         fail "\"$line\" offers \"${offered//$'\n'/ }\", not \"${expected//$'\n'/ }\""
@@ -49,7 +54,17 @@ offers 'kelvo -t dirs/alpha :' dirs
 COMP_WORDBREAKS=${COMP_WORDBREAKS//:/}
 offers 'kelvo -t dirs/alpha:dirs/b' dirs/alpha:dirs/beta
 
-for shell in 'zsh _kelvo' 'fish kelvo.fish'; do
+offers 'kelvo_sample --re' --records= --record-size=
+offers 'kelvo_sample -p s' story strings
+offers 'kelvo_sample --times seq' sequential
+offers 'kelvo_sample -d dirs/a' dirs/alpha
+offers 'kelvo_sample --seed 1 a' ''
+# So are equals signs.
+offers 'kelvo_sample --profile = m' mixed
+COMP_WORDBREAKS=${COMP_WORDBREAKS//=/}
+offers 'kelvo_sample --profile=m' --profile=mixed
+
+for shell in 'zsh _kelvo' 'fish kelvo.fish' 'zsh _kelvo_sample' 'fish kelvo_sample.fish'; do
     read -r shell file <<<"$shell"
     command -v "$shell" >/dev/null || continue
     "$shell" -n "$completions/$file" || fail "$shell does not understand $file"

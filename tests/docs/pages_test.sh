@@ -50,25 +50,17 @@ same "option with argument" "the option string" "$with_argument" "$page" \
 same "option" "the option string" "$all_options" "the synopsis of $page" \
     "$(part $page '^\.Sh SYNOPSIS' '^\.Sh DESCRIPTION' |
         sed -n 's/^\.Op Fl \([A-Za-z]*\).*/\1/p' | grep -o .)"
-same "option" "the option string" "$all_options" "completions/kelvo.bash" \
-    "$(grep "local options=" completions/kelvo.bash | grep -o -- ' *-[A-Za-z]' | tr -d ' -')"
-same "option without argument" "the option string" \
-    "$(comm -23 <(sort <<<"$all_options") <(sort <<<"$with_argument"))" "completions/kelvo.bash" \
-    "$(sed -n "s/.*flags='-\[\([A-Za-z]*\)\].*/\1/p" completions/kelvo.bash | grep -o .)"
-same "option" "the option string" "$all_options" "completions/_kelvo" \
-    "$(sed -n "s/^    '\(([^)]*)\)\{0,1\}\**-\([A-Za-z]\)+\{0,1\}\[.*/\2/p" completions/_kelvo)"
-same "option" "the option string" "$all_options" "completions/kelvo.fish" \
-    "$(sed -n 's/^complete -c kelvo -s \([A-Za-z]\) .*/\1/p' completions/kelvo.fish)"
+completions=completions/kelvo.options
+same "option" "the option string" "$all_options" "$completions" \
+    "$(sed -n 's/^\([A-Za-z]\)|.*/\1/p' $completions)"
+same "option with argument" "the option string" "$with_argument" "$completions" \
+    "$(sed -n 's/^\([A-Za-z]\)|[^|]*|[^|].*/\1/p' $completions)"
 
 prefix_letters=$(letters_of "$(sed -n 's/.*PREFIX_LETTERS\[\] = "\([^"]*\)".*/\1/p' $options)")
 same "letter of -o" "$options" "$prefix_letters" "$page" \
     "$(part $page '^\.It Fl o Ar' '^\.El' | sed -n 's/^\.It Cm \([a-z]\)$/\1/p')"
-same "letter of -o" "$options" "$prefix_letters" "completions/kelvo.bash" \
-    "$(sed -n 's/.*for letter in \([a-z ]*\);.*/\1/p' completions/kelvo.bash | tr ' ' '\n')"
-same "letter of -o" "$options" "$prefix_letters" "completions/_kelvo" \
-    "$(sed -n "s/^        '\([a-z]\)\[.*/\1/p" completions/_kelvo)"
-same "letter of -o" "$options" "$prefix_letters" "completions/kelvo.fish" \
-    "$(part completions/kelvo.fish 'for field in' ' set ' | grep -o "[ '][a-z]:" | tr -d " ':")"
+same "letter of -o" "$options" "$prefix_letters" "$completions" \
+    "$(sed -n 's/^o||letters //p' $completions | tr , '\n' | sed -n 's/=.*//p')"
 
 # ----------------------------------------------------------- its environment
 
@@ -107,11 +99,20 @@ same "warning" "corruption.cpp" "$warnings" "$page" \
 
 # --------------------------------------------------------- kelvo_sample's options
 
-sample=tools/kelvo_sample/options.cpp
+sample=tools/kelvo_sample/option_table.cpp
 same "option of kelvo_sample" "$sample" \
     "$(sed -nE "s/^    \{\"([a-z-]+)\", ('(.)'|0),.*/\1 \3/p" $sample)" "docs/kelvo_sample.1" \
     "$(sed -nE 's/^\.It Fl ([a-z])( Ar [a-z]+)? , Fl -([a-z-]+)( Ns = .*)?$/\3 \1/p
                s/^\.It Fl -([a-z-]+)( Ns = .*)?$/\1 /p' docs/kelvo_sample.1)"
+
+# ------------------------------------------------------------ the writer library
+
+writer=trace/writer/trace_writer.h
+same "kind to append" "$writer" \
+    "$(sed -nE 's/^    trace_writer_status (append_[a-z0-9_]+)\(const trace_origin.*/\1/p' $writer)" \
+    "docs/trace_writer.3" "$(sed -nE 's/^\.It Fn (append_[a-z0-9_]+).*/\1/p' docs/trace_writer.3)"
+same "status" "$writer" "$(sed -nE 's/^    (TRACE_WRITER_[A-Z_]+) = .*/\1/p' $writer)" \
+    "docs/trace_writer.3" "$(sed -nE 's/^\.It Dv ([A-Z_]+)$/\1/p' docs/trace_writer.3)"
 
 # ------------------------------------------------------------- the file format
 
@@ -139,6 +140,6 @@ same "conversion letter" "$compiler" \
 
 while read -r name section; do
     [ -e "docs/$name.$section" ] || fail "reference to $name($section), which is no page"
-done < <(sed -nE 's/^\.Xr (kelvo[a-z_-]*) ([1-9]).*/\1 \2/p' docs/*.[1-9] | sort -u)
+done < <(sed -nE 's/^\.Xr ((kelvo|trace_)[a-z_-]*) ([1-9]).*/\1 \3/p' docs/*.[1-9] | sort -u)
 
 finish "The pages and completions agree with the sources."

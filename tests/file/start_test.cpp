@@ -121,7 +121,7 @@ std::vector<uint32_t> output_of(const raw_trace& raw, int32_t startOptions, int3
     std::vector<uint32_t> numbers;
     trace_record_header header;
     while (is_last_record(&trace.file, &header) == WALK_RECORD) {
-        if (header.function >= 1 && header.function <= 17 && start_is_reached(&trace.file, header))
+        if (trc_kind_is_output(header.function) && start_is_reached(&trace.file, header))
             numbers.push_back(header.threadId);
         if (step_to_next_record(&trace.file, header) != WALK_RECORD)
             break;

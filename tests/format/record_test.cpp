@@ -346,9 +346,7 @@ TEST_F(record_test, hostile_bodies_of_every_kind_stay_inside_the_record) {
     const uint32_t words[] = {0, 1, 2, 0x7FFFFFFF, 0x80000000, 0xFFFFFFFF};
     CaptureStdout();
     CaptureStderr();
-    for (uint32_t uFunction = 0; uFunction <= 20; uFunction++) {
-        const auto uKind =
-            static_cast<uint16_t>(uFunction < 20 ? uFunction : uint32_t{TRC_FUNC_DISCARDED});
+    for (const trc_kind& kind : TRC_KINDS) {
         for (uint32_t uRound = 0; uRound < 300; uRound++) {
             byte_vector body = raw_bytes(uRound % 13);
             for (uint32_t i = 0; i < uRound % 29; i++)
@@ -359,7 +357,7 @@ TEST_F(record_test, hostile_bodies_of_every_kind_stay_inside_the_record) {
             if (uRound < 60)
                 body.resize(uRound, std::byte{'%'});
             const element_ptr pElement =
-                make_element(&file, uKind, body, uRound % 5 ? "_ZPB" : "____");
+                make_element(&file, kind.function, body, uRound % 5 ? "_ZPB" : "____");
             // The right length, and ones that name more, or less, than the block holds.
             const uint32_t uLength = pElement->header.length;
             for (const uint32_t uNamed : {uLength, uLength + 1000, random() % 28}) {

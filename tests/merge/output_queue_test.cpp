@@ -24,7 +24,7 @@ struct queued {
     uint64_t pushSeqn;
 
     bool changes_base() const {
-        return changes_time_base(uFunction);
+        return trc_kind_changes_time_base(uFunction);
     }
     cu_nanoseconds time() const {
         return cu_time_ns(uTimeStamp,

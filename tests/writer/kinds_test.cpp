@@ -1,11 +1,15 @@
-// The bodies of the record kinds, byte by byte.
+// The bodies of the record kinds, byte by byte; where and when they are written.
 #include "raw_trace.h"
 #include "reference_reader.h"
 #include "temp_dir.h"
 #include "trace_writer.h"
 
 #include <algorithm>
+#include <ctime>
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
 
 namespace {
 
@@ -83,6 +87,30 @@ TEST(trace_kinds, write_their_bodies) {
         EXPECT_EQ(std::string_view(records[i].header.compId, 4), "_TST");
         EXPECT_EQ(records[i].body, body) << function;
     }
+}
+
+TEST(trace_clock, knows_the_time_of_day_and_the_thread) {
+    const auto time_of_day = [] {
+        timespec now{};
+        clock_gettime(CLOCK_REALTIME, &now);
+        return static_cast<cu_nanoseconds>(now.tv_sec) * 1'000'000'000 + now.tv_nsec;
+    };
+    constexpr cu_nanoseconds SLACK = 1'000'000'000; // the time of day may be adjusted meanwhile
+    const cu_nanoseconds before = time_of_day();
+    const cu_timeinfo base = trace_time_base();
+    const trace_origin here = trace_here("_TST");
+    const cu_nanoseconds now = cu_time_ns(here.timeStamp, base);
+    EXPECT_TRUE(now > before - SLACK && now < time_of_day() + SLACK);
+    EXPECT_LE(here.timeStamp, trace_now());
+
+    EXPECT_EQ(here.threadId, static_cast<uint32_t>(gettid()));
+    std::thread([&here] { EXPECT_NE(trace_thread_id(), here.threadId); }).join();
+    const pid_t child = fork();
+    if (child == 0)
+        _exit(trace_thread_id() == static_cast<uint32_t>(getpid()) ? 0 : 1);
+    int status = -1;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
 }
 
 } // namespace

@@ -1,5 +1,5 @@
 // The ring of a file that nobody reads: after every append it is sound, and its
-// records are the newest ones that were appended.
+// records are the newest ones that were appended. How the file is made.
 #include "raw_trace.h"
 #include "reference_reader.h"
 #include "temp_dir.h"
@@ -7,9 +7,32 @@
 
 #include <algorithm>
 #include <cstring>
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <filesystem>
 #include <gtest/gtest.h>
 #include <random>
+#include <sys/resource.h>
+#include <sys/stat.h>
 #include <unistd.h>
+
+namespace {
+
+/// What the next reservations of space return instead of being made.
+std::vector<int> reservationErrors;
+
+} // namespace
+
+/// Stands before the C library's.
+int posix_fallocate(int fd, off_t iAt, off_t iSize) {
+    static const auto reserve =
+        reinterpret_cast<decltype(&posix_fallocate)>(dlsym(RTLD_NEXT, "posix_fallocate"));
+    if (reservationErrors.empty())
+        return reserve(fd, iAt, iSize);
+    const int error = reservationErrors.back();
+    reservationErrors.pop_back();
+    return error;
+}
 
 namespace {
 
@@ -138,10 +161,51 @@ TEST(trace_ring, is_closed_for_a_short_handshake_with_the_header_that_was_asked_
     EXPECT_EQ(ring.records().size(), 1U);
 }
 
+TEST(trace_ring, takes_its_space_from_the_disk_when_it_is_made) {
+    const temp_dir dir;
+    const std::string path = dir.file("trace");
+    constexpr uint32_t SIZE = 9 << 20;
+    // Returns 0 or errno.
+    const auto create = [&](std::vector<int> errors, bool bReserve = true) {
+        reservationErrors = std::move(errors);
+        trace_writer writer;
+        const auto status =
+            writer.create(path.c_str(), {.uFileSize = SIZE, .bReserveSpace = bReserve});
+        const int error = status == TRACE_WRITER_SYSTEM ? errno : 0;
+        EXPECT_EQ(status == TRACE_WRITER_OK, error == 0);
+        EXPECT_EQ(std::filesystem::exists(path), error == 0);
+        return error;
+    };
+    for (const int error : {ENOSPC, EDQUOT, EFBIG}) {
+        ASSERT_EQ(create({}), 0);
+        EXPECT_EQ(create({error}), error);
+    }
+    for (const int error : {EOPNOTSUPP, EINVAL, ENOSYS})
+        EXPECT_EQ(create({error}), 0) << "this file system cannot reserve";
+
+    const auto allocated = [&path] {
+        struct stat status {};
+        stat(path.c_str(), &status);
+        return status.st_blocks * 512;
+    };
+    EXPECT_EQ(create({}, false), 0);
+    EXPECT_LT(allocated(), SIZE);
+    EXPECT_EQ(create({EINTR, EINTR}), 0);
+    EXPECT_GE(allocated(), SIZE);
+
+    rlimit before{};
+    getrlimit(RLIMIT_FSIZE, &before); // beyond the limit the process would get a signal
+    const rlimit limit{SIZE - 1, before.rlim_max};
+    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
+    EXPECT_EQ(create({}), EFBIG);
+    setrlimit(RLIMIT_FSIZE, &before);
+}
+
 TEST(trace_ring, reaches_up_to_four_gibibytes) {
     const temp_dir dir;
     trace_writer writer;
-    if (writer.create(dir.file("large").c_str(), {.uFileSize = 0xFFFFFFFC}) == TRACE_WRITER_SYSTEM)
+    if (writer.create(dir.file("large").c_str(),
+                      {.uFileSize = 0xFFFFFFFC, .bReserveSpace = false}) == TRACE_WRITER_SYSTEM)
         GTEST_SKIP() << "no room for a sparse file of 4 GiB";
     ASSERT_EQ(writer.append_id({"_TST"}, 1), TRACE_WRITER_OK);
     EXPECT_EQ(load<trace_file_header>(writer.mapping(), 0).uOldestRecordOffset, 232U);

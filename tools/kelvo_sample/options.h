@@ -4,8 +4,11 @@
 #include <cstdint>
 #include <string>
 
-/// What the records of the traces are.
+/// What the records of the traces are, in the order of --profile.
 enum class sample_profile { STORY, PLAIN, NUMBERS, STRINGS, DATA, MIXED };
+
+/// What becomes of the first file when it is complete, in the order of --damage.
+enum class sample_damage { NONE, GAP, TORN, FUNCTION, FILLERS, HEADER };
 
 /// What was asked for. Times are nanoseconds, sizes bytes.
 struct sample_options {
@@ -20,6 +23,7 @@ struct sample_options {
     uint32_t uThreads = 4;      ///< per file
     unsigned uAddrBits = 64;    ///< addressing mode in the file headers: 32 or 64
     uint64_t uSeed = 1;
+    sample_damage damage = sample_damage::NONE;
 
     uint64_t uStart = 0;         ///< time of the first record, since the epoch
     uint64_t uStep = 10'000;     ///< from one record to the next

@@ -1,5 +1,6 @@
 #include "sample.h"
 
+#include "damage.h"
 #include "live.h"
 #include "profiles.h"
 #include "story.h"
@@ -87,10 +88,15 @@ int make_sample(const sample_options& options) {
                            : make_profile(options, pLive, &files);
     if (!bGood)
         return 1;
+    const bool bDamage = options.damage != sample_damage::NONE;
+    if (bDamage && !damage_file(options.directory + "/" + files[0]->name, options.damage))
+        return 1;
     warn_of_others(options, files.size());
     if (options.bLive)
         report_live(files);
     else
         tell_what_was_made(options, files);
+    if (bDamage)
+        printf("%s is damaged.\n", files[0]->name.c_str());
     return 0;
 }

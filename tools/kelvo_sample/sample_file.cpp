@@ -45,7 +45,6 @@ bool sample_file::open(const sample_options& options, const std::string& sName,
     file.buildName = "kelvo_sample";
     file.baseProgName = program.name;
     file.tz_offset = options.iMinutesWest;
-    file.bReserveSpace = true;
     const std::string sPath = options.directory + "/" + name;
     const trace_writer_status status = writer.create(sPath.c_str(), file);
     if (status != TRACE_WRITER_OK)

@@ -120,6 +120,83 @@ enum trace_function : uint16_t {
     TRC_FUNC_WRITING = 0xFFFF,      ///< not yet a record; skipped at the oldest position
 };
 
+/// What holds of a kind of record.
+enum trc_kind_bit : uint8_t {
+    TRC_KIND_VALID = 0x01,     ///< may stand in a file; any other function is damage
+    TRC_KIND_COMPONENT = 0x02, ///< compId names a component: four printable characters
+    TRC_KIND_OUTPUT = 0x04,    ///< handed on for output; readers step over the others
+    TRC_KIND_OWN_BASE = 0x08,  ///< its own time stamp is converted by the base in its body
+    TRC_KIND_NEW_BASE = 0x10,  ///< its body brings the time base of what follows it
+    TRC_KIND_TRACED = TRC_KIND_VALID | TRC_KIND_COMPONENT | TRC_KIND_OUTPUT,
+};
+
+struct trc_kind {
+    uint16_t function; ///< a trace_function
+    const char* pName;
+    uint8_t uBits; ///< TRC_KIND_*
+};
+
+/// All kinds, and what every reader and writer has to know about them.
+inline constexpr trc_kind TRC_KINDS[] = {
+    {TRC_FUNC_FILLER, "FILLER", TRC_KIND_VALID},
+    {TRC_FUNC_ID, "ID", TRC_KIND_TRACED},
+    {TRC_FUNC_STRING, "STRING", TRC_KIND_TRACED},
+    {TRC_FUNC_DATA, "DATA", TRC_KIND_TRACED},
+    {TRC_FUNC_INT32, "INT32", TRC_KIND_TRACED},
+    {TRC_FUNC_INT32_2, "INT32_2", TRC_KIND_TRACED},
+    {TRC_FUNC_UINT32, "UINT32", TRC_KIND_TRACED},
+    {TRC_FUNC_UINT32_2, "UINT32_2", TRC_KIND_TRACED},
+    {TRC_FUNC_INT64, "INT64", TRC_KIND_TRACED},
+    {TRC_FUNC_INT64_2, "INT64_2", TRC_KIND_TRACED},
+    {TRC_FUNC_UINT64, "UINT64", TRC_KIND_TRACED},
+    {TRC_FUNC_UINT64_2, "UINT64_2", TRC_KIND_TRACED},
+    {TRC_FUNC_VALUES, "VALUES", TRC_KIND_TRACED},
+    {TRC_FUNC_VALUES64, "VALUES64", TRC_KIND_TRACED},
+    {TRC_FUNC_ERROR, "ERROR", TRC_KIND_TRACED},
+    {TRC_FUNC_STRINGS, "STRINGS", TRC_KIND_TRACED},
+    {TRC_FUNC_START, "START", TRC_KIND_TRACED | TRC_KIND_OWN_BASE | TRC_KIND_NEW_BASE},
+    {TRC_FUNC_TIME_CALIBRATION, "TIME_CALIBRATION",
+     TRC_KIND_VALID | TRC_KIND_OUTPUT | TRC_KIND_NEW_BASE},
+    {TRC_FUNC_RESTART, "RESTART", TRC_KIND_VALID | TRC_KIND_NEW_BASE},
+    {TRC_FUNC_DISCARDED, "DISCARDED", TRC_KIND_VALID},
+    {TRC_FUNC_WRITING, "WRITING", 0},
+};
+
+/// Place of a function in a word of bits; the two highest come first, where 16
+/// bits bring them by themselves.
+constexpr uint16_t trc_kind_place(uint16_t function) {
+    return static_cast<uint16_t>(function + 2);
+}
+
+/// Whether there is a kind of that function, and the bit holds of it. Asked for
+/// every record that is read: no more than a comparison and a shift.
+template <trc_kind_bit BIT> constexpr bool trc_kind_has(uint16_t function) {
+    constexpr uint32_t MASK = [] {
+        uint32_t uMask = 0;
+        for (const trc_kind& kind : TRC_KINDS) // a place beyond the word does not compile
+            uMask |= uint32_t{(kind.uBits & BIT) != 0} << trc_kind_place(kind.function);
+        return uMask;
+    }();
+    const uint16_t uPlace = trc_kind_place(function);
+    return uPlace < 32 && (MASK >> uPlace & 1) != 0;
+}
+
+constexpr bool trc_kind_is_valid(uint16_t function) {
+    return trc_kind_has<TRC_KIND_VALID>(function);
+}
+constexpr bool trc_kind_has_component(uint16_t function) {
+    return trc_kind_has<TRC_KIND_COMPONENT>(function);
+}
+constexpr bool trc_kind_is_output(uint16_t function) {
+    return trc_kind_has<TRC_KIND_OUTPUT>(function);
+}
+constexpr bool trc_kind_has_own_base(uint16_t function) {
+    return trc_kind_has<TRC_KIND_OWN_BASE>(function);
+}
+constexpr bool trc_kind_changes_time_base(uint16_t function) {
+    return trc_kind_has<TRC_KIND_NEW_BASE>(function);
+}
+
 /// Component id of the tracing library's own records.
 inline constexpr char TRC_COMP_INTERNAL[] = "____";
 
@@ -133,7 +210,8 @@ struct [[gnu::packed]] trace_record_header {
     uint32_t threadId;  ///< writing thread
     uint64_t timeStamp; ///< raw; see cu_cvt_time_platform_1
 };
-static_assert(sizeof(trace_record_header) == 28);
+inline constexpr uint32_t TRC_MIN_RECORD = 28; ///< no record is shorter
+static_assert(sizeof(trace_record_header) == TRC_MIN_RECORD);
 static_assert(offsetof(trace_record_header, length) == 0);
 static_assert(offsetof(trace_record_header, function) == 4);
 static_assert(offsetof(trace_record_header, reserved) == 6);

@@ -1,12 +1,17 @@
-// The bodies of the record kinds. All of them are written straight into their
-// place in the ring.
+// The bodies that are more than a row of fields. They are written straight into
+// their place in the ring.
 #include "trace_writer.h"
 
 #include <algorithm>
-#include <array>
 #include <cstring>
 
 namespace {
+
+constexpr std::byte NUL[1]{};
+
+std::string_view up_to_nul(std::string_view text) {
+    return text.substr(0, text.find('\0'));
+}
 
 /// Writes one value after the other; the place was measured before.
 class body_writer {
@@ -24,8 +29,9 @@ public:
         pNext += bytes.size();
     }
 
+    /// Up to its first NUL, and a NUL.
     void put_text(std::string_view text) {
-        put_bytes(std::as_bytes(std::span(text)));
+        put_bytes(std::as_bytes(std::span(up_to_nul(text))));
         put('\0');
     }
 
@@ -36,10 +42,6 @@ public:
 private:
     std::byte* pNext;
 };
-
-std::string_view up_to_nul(std::string_view text) {
-    return text.substr(0, text.find('\0'));
-}
 
 size_t size_with_nul(std::string_view text) {
     return up_to_nul(text).size() + 1;
@@ -103,7 +105,18 @@ trace_record_error error_head(const trace_error_content& error, error_layout* pL
 
 } // namespace
 
-// -------------------------------------------------------------- any body
+/// Fills the body in its place in the ring.
+template <class FILL>
+trace_writer_status trace_writer::append_filled(uint16_t function, const trace_origin& origin,
+                                                size_t bodySize, const FILL& fill) {
+    std::byte* pBody = nullptr;
+    const trace_writer_status status = begin(function, origin, bodySize, &pBody);
+    if (status != TRACE_WRITER_OK)
+        return status;
+    body_writer writer(pBody);
+    fill(writer);
+    return commit();
+}
 
 trace_writer_status trace_writer::append(uint16_t function, const trace_origin& origin,
                                          trace_bytes body) {
@@ -115,136 +128,50 @@ trace_writer_status trace_writer::append(uint16_t function, const trace_origin& 
     size_t uBody = 0;
     for (const trace_bytes part : parts)
         uBody += part.size();
-    std::byte* pBody = nullptr;
-    const trace_writer_status status = begin(function, origin, uBody, &pBody);
-    if (status != TRACE_WRITER_OK)
-        return status;
-    body_writer writer(pBody);
-    for (const trace_bytes part : parts)
-        writer.put_bytes(part);
-    return commit();
+    return append_filled(function, origin, uBody, [&](body_writer& writer) {
+        for (const trace_bytes part : parts)
+            writer.put_bytes(part);
+    });
 }
-
-template <class... T> trace_writer_status
-trace_writer::append_fields(uint16_t function, const trace_origin& origin, const T&... fields) {
-    std::byte* pBody = nullptr;
-    const trace_writer_status status = begin(function, origin, (sizeof(fields) + ... + 0), &pBody);
-    if (status != TRACE_WRITER_OK)
-        return status;
-    body_writer writer(pBody);
-    (writer.put(fields), ...);
-    return commit();
-}
-
-// ----------------------------------------------------------- fixed bodies
-
-trace_writer_status trace_writer::append_id(const trace_origin& origin, uint32_t traceId) {
-    return append_fields(TRC_FUNC_ID, origin, traceId);
-}
-
-trace_writer_status trace_writer::append_int32(const trace_origin& origin, uint32_t traceId,
-                                               int32_t value) {
-    return append_fields(TRC_FUNC_INT32, origin, traceId, value);
-}
-
-trace_writer_status trace_writer::append_int32_2(const trace_origin& origin, uint32_t traceId,
-                                                 int32_t value1, int32_t value2) {
-    return append_fields(TRC_FUNC_INT32_2, origin, traceId, value1, value2);
-}
-
-trace_writer_status trace_writer::append_uint32(const trace_origin& origin, uint32_t traceId,
-                                                uint32_t value) {
-    return append_fields(TRC_FUNC_UINT32, origin, traceId, value);
-}
-
-trace_writer_status trace_writer::append_uint32_2(const trace_origin& origin, uint32_t traceId,
-                                                  uint32_t value1, uint32_t value2) {
-    return append_fields(TRC_FUNC_UINT32_2, origin, traceId, value1, value2);
-}
-
-trace_writer_status trace_writer::append_int64(const trace_origin& origin, uint32_t traceId,
-                                               int64_t value) {
-    return append_fields(TRC_FUNC_INT64, origin, traceId, value);
-}
-
-trace_writer_status trace_writer::append_int64_2(const trace_origin& origin, uint32_t traceId,
-                                                 int64_t value1, int64_t value2) {
-    return append_fields(TRC_FUNC_INT64_2, origin, traceId, value1, value2);
-}
-
-trace_writer_status trace_writer::append_uint64(const trace_origin& origin, uint32_t traceId,
-                                                uint64_t value) {
-    return append_fields(TRC_FUNC_UINT64, origin, traceId, value);
-}
-
-trace_writer_status trace_writer::append_uint64_2(const trace_origin& origin, uint32_t traceId,
-                                                  uint64_t value1, uint64_t value2) {
-    return append_fields(TRC_FUNC_UINT64_2, origin, traceId, value1, value2);
-}
-
-trace_writer_status trace_writer::append_start(const trace_origin& origin, uint32_t traceId,
-                                               uint32_t pid, const cu_timeinfo& timeInfo) {
-    return append_fields(TRC_FUNC_START, origin, traceId, pid, timeInfo);
-}
-
-trace_writer_status trace_writer::append_time_calibration(const trace_origin& origin,
-                                                          const cu_timeinfo& reBase) {
-    return append_fields(TRC_FUNC_TIME_CALIBRATION, origin, reBase);
-}
-
-trace_writer_status trace_writer::append_discarded(const trace_origin& origin) {
-    return append_fields(TRC_FUNC_DISCARDED, origin);
-}
-
-// ------------------------------------------------------- bodies that vary
 
 trace_writer_status trace_writer::append_string(const trace_origin& origin, std::string_view text) {
-    constexpr std::byte NUL{};
-    return append(TRC_FUNC_STRING, origin,
-                  {std::as_bytes(std::span(up_to_nul(text))), trace_bytes(&NUL, 1)});
+    return append(TRC_FUNC_STRING, origin, {std::as_bytes(std::span(up_to_nul(text))), NUL});
 }
 
 trace_writer_status trace_writer::append_restart(const trace_origin& origin, uint32_t traceId,
                                                  uint32_t pid, const cu_timeinfo& timeInfo,
                                                  std::string_view text) {
-    constexpr std::byte NUL{};
-    const uint32_t ids[] = {traceId, pid};
+    const trace_record_start head{{}, traceId, pid, timeInfo};
     return append(TRC_FUNC_RESTART, origin,
-                  {std::as_bytes(std::span(ids)), std::as_bytes(std::span(&timeInfo, 1)),
-                   std::as_bytes(std::span(up_to_nul(text))), trace_bytes(&NUL, 1)});
+                  {trace_body_of(head), std::as_bytes(std::span(up_to_nul(text))), NUL});
 }
 
 trace_writer_status trace_writer::append_data(const trace_origin& origin, uint32_t traceId,
                                               std::span<const trace_bytes> blocks) {
-    size_t uBody = sizeof(trace_record_data) - sizeof(trace_record_header);
+    const trace_record_data head{{}, traceId, static_cast<uint32_t>(blocks.size())};
+    size_t uBody = trace_body_of(head).size();
     for (const trace_bytes block : blocks)
         uBody += sizeof(trace_data) + block.size() + padding_of(block.size());
-    std::byte* pBody = nullptr;
-    const trace_writer_status status = begin(TRC_FUNC_DATA, origin, uBody, &pBody);
-    if (status != TRACE_WRITER_OK)
-        return status;
-    body_writer writer(pBody);
-    writer.put(traceId);
-    writer.put(static_cast<uint32_t>(blocks.size()));
-    for (const trace_bytes block : blocks) {
-        writer.put(static_cast<uint32_t>(block.size()));
-        writer.put_bytes(block);
-        writer.put_padding(padding_of(block.size()));
-    }
-    return commit();
+    return append_filled(TRC_FUNC_DATA, origin, uBody, [&](body_writer& writer) {
+        writer.put_bytes(trace_body_of(head));
+        for (const trace_bytes block : blocks) {
+            writer.put(static_cast<uint32_t>(block.size()));
+            writer.put_bytes(block);
+            writer.put_padding(padding_of(block.size()));
+        }
+    });
 }
 
 trace_writer_status trace_writer::append_values(const trace_origin& origin, uint32_t traceId,
                                                 std::span<const uint32_t> values) {
-    const uint32_t head[] = {traceId, static_cast<uint32_t>(values.size())};
-    return append(TRC_FUNC_VALUES, origin, {std::as_bytes(std::span(head)), std::as_bytes(values)});
+    const trace_record_values head{{}, traceId, static_cast<uint32_t>(values.size())};
+    return append(TRC_FUNC_VALUES, origin, {trace_body_of(head), std::as_bytes(values)});
 }
 
 trace_writer_status trace_writer::append_values64(const trace_origin& origin, uint32_t traceId,
                                                   std::span<const uint64_t> values) {
-    const uint32_t head[] = {traceId, static_cast<uint32_t>(values.size())};
-    return append(TRC_FUNC_VALUES64, origin,
-                  {std::as_bytes(std::span(head)), std::as_bytes(values)});
+    const trace_record_values head{{}, traceId, static_cast<uint32_t>(values.size())};
+    return append(TRC_FUNC_VALUES64, origin, {trace_body_of(head), std::as_bytes(values)});
 }
 
 trace_writer_status trace_writer::append_strings(const trace_origin& origin, uint32_t traceId,
@@ -252,18 +179,14 @@ trace_writer_status trace_writer::append_strings(const trace_origin& origin, uin
     size_t uText = 0;
     for (const std::string_view text : strings)
         uText += size_with_nul(text);
-    const size_t uHead = sizeof(trace_record_strings) - sizeof(trace_record_header);
-    std::byte* pBody = nullptr;
-    const trace_writer_status status = begin(TRC_FUNC_STRINGS, origin, uHead + uText, &pBody);
-    if (status != TRACE_WRITER_OK)
-        return status;
-    body_writer writer(pBody);
-    writer.put(traceId);
-    writer.put(static_cast<uint32_t>(strings.size()));
-    writer.put(static_cast<uint32_t>(uText));
-    for (const std::string_view text : strings)
-        writer.put_text(up_to_nul(text));
-    return commit();
+    const trace_record_strings head{
+        {}, traceId, static_cast<uint32_t>(strings.size()), static_cast<uint32_t>(uText)};
+    const size_t uBody = trace_body_of(head).size() + uText;
+    return append_filled(TRC_FUNC_STRINGS, origin, uBody, [&](body_writer& writer) {
+        writer.put_bytes(trace_body_of(head));
+        for (const std::string_view text : strings)
+            writer.put_text(text);
+    });
 }
 
 trace_writer_status trace_writer::append_error(const trace_origin& origin,
@@ -273,25 +196,19 @@ trace_writer_status trace_writer::append_error(const trace_origin& origin,
     error_layout argLayout = layout; // continues behind the head's strings
     for (const cu_error_arg_t& arg : error.args)
         argLayout.add(text_of(arg));
-    std::byte* pBody = nullptr;
-    const trace_writer_status status = begin(TRC_FUNC_ERROR, origin, argLayout.body_size(), &pBody);
-    if (status != TRACE_WRITER_OK)
-        return status;
-
-    body_writer writer(pBody);
-    writer.put_bytes(std::as_bytes(std::span(&head, 1)).subspan(sizeof(trace_record_header)));
-    for (cu_error_arg_t arg : error.args) {
-        if (arg.cu_arg_type == CU_ERROR_ARG_CHAR_STR)
-            arg.cu_arg_value.cu_arg_long = layout.add(text_of(arg));
-        writer.put(arg);
-    }
-    const std::string_view texts[] = {present(error.funcName), present(error.fileName),
-                                      error.ffdcId, error.msgCatName, error.defMsg};
-    for (const std::string_view text : texts)
-        if (text.data() != nullptr)
-            writer.put_text(up_to_nul(text));
-    for (const cu_error_arg_t& arg : error.args)
-        if (const std::string_view text = text_of(arg); text.data() != nullptr)
-            writer.put_text(up_to_nul(text));
-    return commit();
+    return append_filled(TRC_FUNC_ERROR, origin, argLayout.body_size(), [&](body_writer& writer) {
+        writer.put_bytes(trace_body_of(head));
+        for (cu_error_arg_t arg : error.args) {
+            if (arg.cu_arg_type == CU_ERROR_ARG_CHAR_STR)
+                arg.cu_arg_value.cu_arg_long = layout.add(text_of(arg));
+            writer.put(arg);
+        }
+        for (const std::string_view text : {present(error.funcName), present(error.fileName),
+                                            error.ffdcId, error.msgCatName, error.defMsg})
+            if (text.data() != nullptr)
+                writer.put_text(text);
+        for (const cu_error_arg_t& arg : error.args)
+            if (const std::string_view text = text_of(arg); text.data() != nullptr)
+                writer.put_text(text);
+    });
 }

@@ -8,14 +8,13 @@
 // whose writer is killed in between has no 0xFFFF behind the first record.
 #include "trace_writer.h"
 
-#include "writer_words.h"
+#include "shared_words.h"
 
+#include <bit>
 #include <ctime>
 #include <fcntl.h>
 
 namespace {
-
-constexpr uint32_t MIN_RECORD = sizeof(trace_record_header);
 
 /// Between two questions for the lock, ms.
 constexpr uint64_t ASK_INTERVAL = 10;
@@ -26,6 +25,11 @@ uint64_t now_ms() {
     timespec now{};
     clock_gettime(CLOCK_MONOTONIC_COARSE, &now);
     return static_cast<uint64_t>(now.tv_sec) * 1000 + static_cast<uint64_t>(now.tv_nsec) / 1000000;
+}
+
+/// The word of a record header that holds `function`.
+uint32_t function_word(uint16_t function) {
+    return std::bit_cast<uint32_t>(std::array<uint16_t, 2>{function, 0});
 }
 
 } // namespace
@@ -42,21 +46,20 @@ trace_writer_status trace_writer::poll() {
 }
 
 void trace_writer::answer_reader() {
-    uint32_t uTailReq = shared_tail_request(pMap).load(std::memory_order_acquire);
+    uint32_t uTailReq = load_tail_request(file_header());
     if (uTailReq == 0 && !bHolding) [[likely]]
         return;
     if (!bHolding)
         start_holding();
     if (uTailReq != 0 && forget_dead_reader())
-        uTailReq = shared_tail_request(pMap).load(std::memory_order_acquire);
+        uTailReq = load_tail_request(file_header());
     if (uTailReq != 0)
         return;
     // A reader that raises the word from now on must not find the old answer:
-    // either it sees the bit cleared, or its request is seen here. (Both
-    // accesses are sequentially consistent.)
-    shared_flags(pMap).fetch_and(static_cast<uint16_t>(~TRC_FLAG_TAIL_ACK));
-    if (shared_tail_request(pMap).load() != 0)
-        shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK);
+    // either it sees the bit cleared, or its request is seen here.
+    withdraw_acknowledgement(file_header());
+    if (load_tail_request(file_header()) != 0)
+        acknowledge_tail_request(file_header());
     else
         publish_held();
 }
@@ -64,14 +67,14 @@ void trace_writer::answer_reader() {
 void trace_writer::start_holding() {
     bHolding = true;
     uLastHeld = 0;
-    uHeldEnd = uWrite + MIN_RECORD;
+    uHeldEnd = uWrite + TRC_MIN_RECORD;
     uNextAsk = now_ms() + ASK_AFTER_REQUEST;
-    shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK);
+    acknowledge_tail_request(file_header());
 }
 
 /// The place of a held record, and the rest of the gap behind it.
 bool trace_writer::place_held(uint32_t uLength) {
-    const uint64_t uNeeded = uint64_t{uLength} + MIN_RECORD;
+    const uint64_t uNeeded = uint64_t{uLength} + TRC_MIN_RECORD;
     if (uHeldEnd > uGapEnd || uGapEnd - uHeldEnd < uNeeded)
         return false;
     current.uAt = uHeldEnd;
@@ -88,12 +91,11 @@ void trace_writer::commit_held() {
     const auto words = std::bit_cast<header_words>(current.header);
     const uint32_t uAt = current.uAt;
     for (size_t i = WORD_SEQ_NUMBER; i < words.size(); ++i)
-        shared<uint32_t>(pMap, uAt + i * sizeof(uint32_t))
-            .store(words[i], std::memory_order_relaxed);
-    shared_word_of(pMap, uAt, WORD_LENGTH).store(words[WORD_LENGTH], std::memory_order_release);
-    shared_word_of(pMap, uAt, WORD_FUNCTION).store(words[WORD_FUNCTION], std::memory_order_release);
+        store_header_word(pMap + uAt, i, words[i]);
+    store_header_word(pMap + uAt, WORD_LENGTH, words[WORD_LENGTH]);
+    store_header_word(pMap + uAt, WORD_FUNCTION, words[WORD_FUNCTION]);
     if (uLastHeld == 0) // the chain begins: the gap lets it be seen
-        shared_word_of(pMap, uWrite, WORD_LENGTH).store(MIN_RECORD, std::memory_order_release);
+        store_header_word(pMap + uWrite, WORD_LENGTH, TRC_MIN_RECORD);
     uLastHeld = uAt;
     uHeldEnd = current.uOldest;
     ++totals.uHeld;
@@ -106,16 +108,15 @@ void trace_writer::publish_held() {
     uint32_t uSeqNumber = uNextSeq + 2 * static_cast<uint32_t>(totals.uHeld);
     uNextSeq = uSeqNumber;
     for (uint32_t uAt = uLastHeld; uAt != 0;) {
-        const trace_record_header header = own_header(pMap, uAt);
+        const trace_record_header header = header_at(uAt);
         uSeqNumber -= 2;
-        shared_word_of(pMap, uAt, WORD_SEQ_NUMBER).store(uSeqNumber, std::memory_order_relaxed);
-        shared_word_of(pMap, uAt, WORD_FUNCTION)
-            .store(function_word(header.reserved), std::memory_order_release);
+        store_header_word(pMap + uAt, WORD_SEQ_NUMBER, uSeqNumber);
+        store_header_word(pMap + uAt, WORD_FUNCTION, function_word(header.reserved));
         uAt = header.seqNumber;
     }
     uWrite = uHeldEnd;
     swallow_first_filler();
-    shared_oldest(pMap).store(uWrite, std::memory_order_release);
+    store_oldest_record_offset(file_header(), uWrite);
     totals.uAppended += totals.uHeld;
     totals.uHeld = 0;
     uLastHeld = 0;
@@ -131,8 +132,8 @@ bool trace_writer::forget_dead_reader() {
     const uint64_t uNow = now_ms();
     if (uNow < uNextAsk)
         return false;
-    uint32_t uTailReq = shared_tail_request(pMap).load(std::memory_order_acquire);
-    uint32_t uSeqLock = shared_seq_lock(pMap).load(std::memory_order_acquire);
+    const uint32_t uTailReq = load_tail_request(file_header());
+    const uint32_t uSeqLock = load_reader_position(file_header());
     if (uTailReq == 0 && uSeqLock == TRC_SEQ_NO_READER)
         return false;
     uNextAsk = uNow + ASK_INTERVAL;
@@ -141,8 +142,6 @@ bool trace_writer::forget_dead_reader() {
     lock.l_whence = SEEK_SET;
     if (fcntl(fd, F_GETLK, &lock) != 0 || lock.l_type != F_UNLCK)
         return false;
-    shared_seq_lock(pMap).compare_exchange_strong(uSeqLock, TRC_SEQ_NO_READER);
-    if (uTailReq != 0)
-        shared_tail_request(pMap).compare_exchange_strong(uTailReq, 0);
+    forget_reader(file_header(), uSeqLock, uTailReq);
     return true;
 }

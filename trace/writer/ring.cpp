@@ -3,24 +3,23 @@
 // The header of trace_writer.h says why the order is what it is.
 #include "trace_writer.h"
 
-#include "writer_words.h"
+#include "shared_words.h"
 
 #include <algorithm>
+#include <bit>
 
 namespace {
 
-constexpr uint32_t MIN_RECORD = sizeof(trace_record_header);
-
 bool function_is_valid(uint16_t function) {
-    return (function >= TRC_FUNC_ID && function <= TRC_FUNC_TIME_CALIBRATION) ||
-           function == TRC_FUNC_RESTART || function == TRC_FUNC_DISCARDED;
+    return function != TRC_FUNC_FILLER && trc_kind_is_valid(function);
 }
 
 bool origin_is_valid(uint16_t function, const trace_origin& origin) {
     if (origin.compId.size() != sizeof(trace_record_header::compId))
         return false;
-    return function > TRC_FUNC_START || std::all_of(origin.compId.begin(), origin.compId.end(),
-                                                    [](char c) { return c >= 0x20 && c <= 0x7E; });
+    return !trc_kind_has_component(function) ||
+           std::all_of(origin.compId.begin(), origin.compId.end(),
+                       [](char c) { return c >= 0x20 && c <= 0x7E; });
 }
 
 trace_record_header make_header(uint16_t function, const trace_origin& origin, uint32_t uLength) {
@@ -36,8 +35,7 @@ trace_record_header make_header(uint16_t function, const trace_origin& origin, u
 /// Everything of a header but length, function and seqNumber.
 void store_origin(std::byte* pMap, uint32_t uAt, const header_words& words) {
     for (size_t i = WORD_COMP_ID; i < words.size(); ++i)
-        shared<uint32_t>(pMap, uAt + i * sizeof(uint32_t))
-            .store(words[i], std::memory_order_relaxed);
+        store_header_word(pMap + uAt, i, words[i]);
 }
 
 } // namespace
@@ -50,10 +48,10 @@ void trace_writer::store_filler(uint32_t uAt, uint32_t uLength) {
     // comes last.
     const auto words = std::bit_cast<header_words>(
         make_header(TRC_FUNC_FILLER, {TRC_COMP_INTERNAL, 0, uLastTime}, uLength));
-    shared_word_of(pMap, uAt, WORD_FUNCTION).store(words[WORD_FUNCTION], std::memory_order_relaxed);
-    shared_word_of(pMap, uAt, WORD_SEQ_NUMBER).store(TRC_SEQ_FILLER, std::memory_order_relaxed);
+    store_header_word(pMap + uAt, WORD_FUNCTION, words[WORD_FUNCTION]);
+    store_header_word(pMap + uAt, WORD_SEQ_NUMBER, TRC_SEQ_FILLER);
     store_origin(pMap, uAt, words);
-    shared_word_of(pMap, uAt, WORD_LENGTH).store(uLength, std::memory_order_release);
+    store_header_word(pMap + uAt, WORD_LENGTH, uLength);
 }
 
 trace_writer_status trace_writer::begin(uint16_t function, const trace_origin& origin,
@@ -62,10 +60,10 @@ trace_writer_status trace_writer::begin(uint16_t function, const trace_origin& o
         return TRACE_WRITER_INVALID;
     if (bDamaged)
         return TRACE_WRITER_DAMAGED;
-    const uint32_t uMaxBody = max_record_length() - MIN_RECORD;
+    const uint32_t uMaxBody = max_record_length() - TRC_MIN_RECORD;
     if (bodySize > uMaxBody)
         return TRACE_WRITER_TOO_LONG;
-    const uint32_t uLength = (MIN_RECORD + static_cast<uint32_t>(bodySize) + 3) & ~3U;
+    const uint32_t uLength = (TRC_MIN_RECORD + static_cast<uint32_t>(bodySize) + 3) & ~3U;
 
     answer_reader();
     bool bRoom = make_room(uLength, origin.timeStamp);
@@ -82,7 +80,7 @@ trace_writer_status trace_writer::begin(uint16_t function, const trace_origin& o
         return TRACE_WRITER_DROPPED;
     }
     current.header = make_header(function, origin, uLength);
-    *ppBody = pMap + current.uAt + MIN_RECORD;
+    *ppBody = pMap + current.uAt + TRC_MIN_RECORD;
     // Unused bytes stand only in the last word.
     if (bodySize % 4 != 0)
         std::memset(*ppBody + bodySize, 0, 4 - bodySize % 4);
@@ -97,10 +95,10 @@ trace_writer_status trace_writer::commit() {
     const auto words = std::bit_cast<header_words>(current.header);
     const uint32_t uAt = current.uAt;
     store_origin(pMap, uAt, words);
-    shared_word_of(pMap, uAt, WORD_LENGTH).store(words[WORD_LENGTH], std::memory_order_release);
-    shared_word_of(pMap, uAt, WORD_FUNCTION).store(words[WORD_FUNCTION], std::memory_order_release);
-    shared_oldest(pMap).store(current.uOldest, std::memory_order_release);
-    shared_word_of(pMap, uAt, WORD_SEQ_NUMBER).store(uNextSeq, std::memory_order_release);
+    store_header_word(pMap + uAt, WORD_LENGTH, words[WORD_LENGTH]);
+    store_header_word(pMap + uAt, WORD_FUNCTION, words[WORD_FUNCTION]);
+    store_oldest_record_offset(file_header(), current.uOldest);
+    store_header_word(pMap + uAt, WORD_SEQ_NUMBER, uNextSeq);
     uWrite = current.uOldest;
     uGapEnd = current.uGapEnd;
     uNextSeq += 2;
@@ -143,31 +141,31 @@ bool trace_writer::place(uint32_t uLength, uint64_t uTimeStamp) {
 /// `uLengthAfter` bytes for which it makes way has room too: else the ring would
 /// fill with such records.
 bool trace_writer::append_discard(uint32_t uLengthAfter) {
-    const uint64_t uBoth = uint64_t{uLengthAfter} + (uLengthAfter != 0 ? MIN_RECORD : 0);
+    const uint64_t uBoth = uint64_t{uLengthAfter} + (uLengthAfter != 0 ? TRC_MIN_RECORD : 0);
     if (bHolding) {
         if (uBoth > max_record_length() || !place_held(static_cast<uint32_t>(uBoth)))
             return false;
     } else {
         swallow_first_filler();
         gap_plan plan;
-        const uint32_t uSeqLock = shared_seq_lock(pMap).load(std::memory_order_acquire);
+        const uint32_t uSeqLock = load_reader_position(file_header());
         if (!plan_room(uBoth, &plan) && uSeqLock != TRC_SEQ_NO_READER) {
             if (uSeqLock != uNextSeq)
                 return false;
             // The reader has passed all there is, and only the gap on which it
             // may stand is in the way: move on past the end with it.
             gap_plan toHead;
-            if (plan_grown_gap(uSize, &toHead) && plan_head(2 * MIN_RECORD, &toHead)) {
+            if (plan_grown_gap(uSize, &toHead) && plan_head(2 * TRC_MIN_RECORD, &toHead)) {
                 toHead.bWrap = true;
                 carry_out(toHead);
             }
         }
     }
-    if (!place(MIN_RECORD, lastDropped.timeStamp))
+    if (!place(TRC_MIN_RECORD, lastDropped.timeStamp))
         return false;
-    current.header =
-        make_header(TRC_FUNC_DISCARDED,
-                    {TRC_COMP_INTERNAL, lastDropped.threadId, lastDropped.timeStamp}, MIN_RECORD);
+    current.header = make_header(TRC_FUNC_DISCARDED,
+                                 {TRC_COMP_INTERNAL, lastDropped.threadId, lastDropped.timeStamp},
+                                 TRC_MIN_RECORD);
     commit();
     uDropsDue = 0;
     ++totals.uDiscards;
@@ -176,15 +174,15 @@ bool trace_writer::append_discard(uint32_t uLengthAfter) {
 
 /// Finds out how a record of `uLength` bytes can get room. Changes nothing.
 bool trace_writer::plan_room(uint64_t uLength, gap_plan* pPlan) {
-    if (uLength > max_record_length() || !plan_grown_gap(uLength + MIN_RECORD, pPlan))
+    if (uLength > max_record_length() || !plan_grown_gap(uLength + TRC_MIN_RECORD, pPlan))
         return false;
     const uint32_t uRoom = pPlan->uEnd - uWrite;
-    if (uRoom >= uLength + MIN_RECORD)
+    if (uRoom >= uLength + TRC_MIN_RECORD)
         return true;
     // The gap reaches the end of the file. The record ends there too, with the
     // next gap at the start of the area; or it goes to the start itself.
     pPlan->bWrap = uRoom != uLength;
-    return plan_head(pPlan->bWrap ? uLength + MIN_RECORD : MIN_RECORD, pPlan);
+    return plan_head(pPlan->bWrap ? uLength + TRC_MIN_RECORD : TRC_MIN_RECORD, pPlan);
 }
 
 /// Lets the gap grow to `uNeeded` bytes, or up to the end of the file.
@@ -215,8 +213,8 @@ bool trace_writer::plan_head(uint64_t uNeeded, gap_plan* pPlan) {
 /// Extends `*pEnd` over the record or filler that begins there and ends at
 /// `uLimit` at the latest, if no reader can be standing on it.
 bool trace_writer::swallow(uint32_t* pEnd, uint32_t uLimit, gap_plan* pPlan) {
-    const trace_record_header header = own_header(pMap, *pEnd);
-    if (header.length < MIN_RECORD || header.length > uLimit - *pEnd) {
+    const trace_record_header header = header_at(*pEnd);
+    if (header.length < TRC_MIN_RECORD || header.length > uLimit - *pEnd) {
         bDamaged = true;
         return false;
     }
@@ -233,10 +231,10 @@ bool trace_writer::swallow(uint32_t* pEnd, uint32_t uLimit, gap_plan* pPlan) {
 /// fillers follow before the gap.
 uint32_t trace_writer::seq_number_from(uint32_t uAt) const {
     while (uAt != uWrite) {
-        const trace_record_header header = own_header(pMap, uAt);
+        const trace_record_header header = header_at(uAt);
         if (header.function != TRC_FUNC_FILLER)
             return header.seqNumber;
-        if (header.length < MIN_RECORD || header.length > uSize - uAt)
+        if (header.length < TRC_MIN_RECORD || header.length > uSize - uAt)
             break;
         uAt = header.length == uSize - uAt ? uArea : uAt + header.length;
     }
@@ -244,7 +242,7 @@ uint32_t trace_writer::seq_number_from(uint32_t uAt) const {
 }
 
 bool trace_writer::reader_has_passed(uint32_t uSeqNumber) const {
-    const uint32_t uSeqLock = shared_seq_lock(pMap).load(std::memory_order_acquire);
+    const uint32_t uSeqLock = load_reader_position(file_header());
     if (uSeqLock == TRC_SEQ_NO_READER)
         return true;
     // An odd number is none of ours: the reader has not found its place.
@@ -255,8 +253,7 @@ bool trace_writer::reader_has_passed(uint32_t uSeqNumber) const {
 void trace_writer::carry_out(const gap_plan& plan) {
     totals.uGivenUp += plan.uGivenUp;
     if (plan.uEnd != uGapEnd) {
-        shared_word_of(pMap, uWrite, WORD_LENGTH)
-            .store(plan.uEnd - uWrite, std::memory_order_release);
+        store_header_word(pMap + uWrite, WORD_LENGTH, plan.uEnd - uWrite);
         uGapEnd = plan.uEnd;
     }
     if (plan.bWrap)
@@ -270,10 +267,9 @@ void trace_writer::carry_out(const gap_plan& plan) {
 void trace_writer::move_to_head(const gap_plan& plan) {
     const uint32_t uFirstEnd = plan.uHeadEnd == uSize ? uWrite : plan.uHeadEnd;
     store_filler(uArea, uFirstEnd - uArea);
-    shared_oldest(pMap).store(uArea, std::memory_order_release);
+    store_oldest_record_offset(file_header(), uArea);
     if (plan.uHeadEnd != uFirstEnd) // the old gap as well, now that no walk begins on it
-        shared_word_of(pMap, uArea, WORD_LENGTH)
-            .store(plan.uHeadEnd - uArea, std::memory_order_release);
+        store_header_word(pMap + uArea, WORD_LENGTH, plan.uHeadEnd - uArea);
     uWrite = uArea;
     uGapEnd = plan.uHeadEnd;
 }
@@ -285,5 +281,5 @@ void trace_writer::swallow_first_filler() {
         return;
     bFirstFiller = false;
     uGapEnd = uSize;
-    shared_word_of(pMap, uWrite, WORD_LENGTH).store(uGapEnd - uWrite, std::memory_order_release);
+    store_header_word(pMap + uWrite, WORD_LENGTH, uGapEnd - uWrite);
 }

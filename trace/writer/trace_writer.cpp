@@ -2,20 +2,20 @@
 // ring, closing it.
 #include "trace_writer.h"
 
-#include "writer_words.h"
+#include "shared_words.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <fcntl.h>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
 
-constexpr uint32_t MIN_RECORD = sizeof(trace_record_header);
 /// A gap, and the shortest record or the last filler of an empty ring.
-constexpr uint32_t MIN_AREA = 2 * MIN_RECORD;
+constexpr uint32_t MIN_AREA = 2 * TRC_MIN_RECORD;
 /// The header fields that both sides of the protocol use end here.
 constexpr uint32_t MIN_OFFSET = offsetof(trace_file_header, program);
 
@@ -56,6 +56,28 @@ trace_file_header make_header(const trace_writer_options& options) {
     return header;
 }
 
+/// Makes the empty file as long as it will be; not by sparse bytes if that can
+/// be helped. Returns 0 or an errno value.
+int set_size(int fd, const trace_writer_options& options) {
+    rlimit limit{};
+    if (getrlimit(RLIMIT_FSIZE, &limit) == 0 && options.uFileSize > limit.rlim_cur)
+        return EFBIG; // the call itself would send SIGXFSZ
+    if (ftruncate(fd, options.uFileSize) != 0)
+        return errno;
+    // In pieces: a call that a signal interrupts begins again.
+    constexpr off_t PIECE = 8 << 20;
+    for (off_t iAt = 0; options.bReserveSpace && iAt < options.uFileSize;) {
+        const off_t iSize = std::min<off_t>(PIECE, options.uFileSize - iAt);
+        const int error = posix_fallocate(fd, iAt, iSize);
+        if (error == EOPNOTSUPP || error == EINVAL || error == ENOSYS)
+            break; // the file system can do neither this nor what stands in for it
+        if (error != 0 && error != EINTR)
+            return error;
+        iAt += error == 0 ? iSize : 0;
+    }
+    return 0;
+}
+
 } // namespace
 
 trace_writer::~trace_writer() {
@@ -88,14 +110,11 @@ trace_writer_status trace_writer::make_file(const char* pPath,
     if (unlink(pPath) != 0 && errno != ENOENT)
         return TRACE_WRITER_SYSTEM;
     fd = open(pPath, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, options.uMode);
-    if (fd < 0 || ftruncate(fd, options.uFileSize) != 0)
+    if (fd < 0)
         return TRACE_WRITER_SYSTEM;
-    if (options.bReserveSpace) {
-        const int error = posix_fallocate(fd, 0, options.uFileSize);
-        if (error != 0) {
-            errno = error;
-            return TRACE_WRITER_SYSTEM;
-        }
+    if (const int error = set_size(fd, options); error != 0) {
+        errno = error;
+        return TRACE_WRITER_SYSTEM;
     }
     void* const pAddress =
         mmap(nullptr, options.uFileSize, PROT_READ | PROT_WRITE, MAP_SHARED, fd, 0);
@@ -122,13 +141,12 @@ void trace_writer::lay_out_file(const trace_writer_options& options) {
     const trace_file_header header = make_header(options);
     std::memcpy(pMap, &header, std::min<size_t>(sizeof(header), uArea));
     bFirstFiller = true;
-    uGapEnd = uSize - MIN_RECORD;
-    store_filler(uGapEnd, MIN_RECORD);
-    shared_word_of(pMap, uGapEnd, WORD_SEQ_NUMBER).store(uNextSeq, std::memory_order_relaxed);
+    uGapEnd = uSize - TRC_MIN_RECORD;
+    store_filler(uGapEnd, TRC_MIN_RECORD);
+    store_header_word(pMap + uGapEnd, WORD_SEQ_NUMBER, uNextSeq);
     store_filler(uWrite, uGapEnd - uWrite);
     // Only now is it a trace file to anybody who opens it.
-    shared<uint32_t>(pMap, offsetof(trace_file_header, uActualFileSize))
-        .store(uSize, std::memory_order_release);
+    store_actual_file_size(file_header(), uSize);
 }
 
 void trace_writer::close() {
@@ -141,7 +159,7 @@ void trace_writer::close() {
     }
     if (bHolding)
         publish_held();
-    shared_flags(pMap).fetch_or(TRC_FLAG_TAIL_ACK, std::memory_order_release);
+    acknowledge_tail_request(file_header());
     munmap(pMap, uSize);
     pMap = nullptr;
     uSize = 0;
@@ -150,5 +168,5 @@ void trace_writer::close() {
 }
 
 uint32_t trace_writer::max_record_length() const {
-    return pMap == nullptr ? 0 : uSize - uArea - MIN_RECORD;
+    return pMap == nullptr ? 0 : uSize - uArea - TRC_MIN_RECORD;
 }

@@ -55,8 +55,19 @@
 //    bForgetDeadReaders.)
 // 5. A closed file has bit 15 set, so a reader's wait is short. A file whose
 //    writer was killed at any point is a sound ring too.
+//
+// THE SPACE. A store into a mapped page for which the disk has no room ends the
+// process with SIGBUS. So create takes all space of the file at once, and when
+// the disk (or a quota, or the process's limit of file sizes) does not allow it,
+// create fails with TRACE_WRITER_SYSTEM and errno ENOSPC, EDQUOT or EFBIG, and
+// leaves no file: the program goes on untraced. A file of that name is gone by
+// then; its space may be what the new one needs. Where the file system cannot
+// reserve, each block is written once; where even that is refused, and with
+// bReserveSpace false, the file is sparse and the risk stays. A file system that
+// writes every change to a new place (copy on write) may break the reservation.
 #pragma once
 
+#include "trace_clock.h"
 #include "trace_file_fmt.h"
 #include "trace_load.h"
 
@@ -99,17 +110,24 @@ struct trace_writer_options {
 
     uint32_t uFirstSeqNumber = 2;   ///< number of the first record; even
     unsigned uMode = 0644;          ///< permissions of the new file, before the umask
-    bool bReserveSpace = false;     ///< allocate all blocks now: a full disk shows here, not later
+    bool bReserveSpace = true;      ///< take the file's space from the disk now; see THE SPACE
     bool bForgetDeadReaders = true; ///< false when the reader is a thread of this process
 };
 
 /// Where and when a record was written. compId: four characters, printable for
-/// kinds 1 to 16. timeStamp is raw, in the file's time base.
+/// kinds with TRC_KIND_COMPONENT. timeStamp is raw, in the file's time base.
 struct trace_origin {
     std::string_view compId;
     uint32_t threadId = 0;
     uint64_t timeStamp = 0;
 };
+
+/// The origin of a record of the calling thread, now; the file's timeInfo is
+/// that of trace_time_base(). With several threads call it under their lock, so
+/// that the times of the file rise.
+inline trace_origin trace_here(std::string_view compId) {
+    return {compId, trace_thread_id(), trace_now()};
+}
 
 /// The content of an error record. Texts with a null data() are absent;
 /// funcName and fileName are always written. Arguments of type
@@ -128,6 +146,11 @@ struct trace_error_content {
     std::string_view defMsg;
     std::span<const cu_error_arg_t> args;
 };
+
+/// The bytes of a record behind its header.
+template <class RECORD> trace_bytes trace_body_of(const RECORD& record) {
+    return std::as_bytes(std::span(&record, 1)).subspan(sizeof(trace_record_header));
+}
 
 /// What a writer has done so far.
 struct trace_writer_counts {
@@ -169,29 +192,65 @@ public:
     // or a negative status.
 
     /// Any kind from its body: the bytes that follow the record header.
-    /// `function` must be valid in a file: 1 to 17, 19 or 0xFFFE.
+    /// `function` must be a kind with TRC_KIND_VALID, and no filler.
     trace_writer_status append(uint16_t function, const trace_origin& origin, trace_bytes body);
     /// The same, the body being the concatenation of `parts`.
     trace_writer_status append(uint16_t function, const trace_origin& origin,
                                std::initializer_list<trace_bytes> parts);
 
-    trace_writer_status append_id(const trace_origin& origin, uint32_t traceId);
+    trace_writer_status append_id(const trace_origin& origin, uint32_t traceId) {
+        return append_fields<trace_record_id>(TRC_FUNC_ID, origin, traceId);
+    }
+    trace_writer_status append_int32(const trace_origin& origin, uint32_t traceId, int32_t value) {
+        return append_fields<trace_record_int32>(TRC_FUNC_INT32, origin, traceId, value);
+    }
+    trace_writer_status append_int32_2(const trace_origin& origin, uint32_t traceId, int32_t value1,
+                                       int32_t value2) {
+        return append_fields<trace_record_int32_2>(TRC_FUNC_INT32_2, origin, traceId, value1,
+                                                   value2);
+    }
+    trace_writer_status append_uint32(const trace_origin& origin, uint32_t traceId,
+                                      uint32_t value) {
+        return append_fields<trace_record_uint32>(TRC_FUNC_UINT32, origin, traceId, value);
+    }
+    trace_writer_status append_uint32_2(const trace_origin& origin, uint32_t traceId,
+                                        uint32_t value1, uint32_t value2) {
+        return append_fields<trace_record_uint32_2>(TRC_FUNC_UINT32_2, origin, traceId, value1,
+                                                    value2);
+    }
+    trace_writer_status append_int64(const trace_origin& origin, uint32_t traceId, int64_t value) {
+        return append_fields<trace_record_int64>(TRC_FUNC_INT64, origin, traceId, value);
+    }
+    trace_writer_status append_int64_2(const trace_origin& origin, uint32_t traceId, int64_t value1,
+                                       int64_t value2) {
+        return append_fields<trace_record_int64_2>(TRC_FUNC_INT64_2, origin, traceId, value1,
+                                                   value2);
+    }
+    trace_writer_status append_uint64(const trace_origin& origin, uint32_t traceId,
+                                      uint64_t value) {
+        return append_fields<trace_record_uint64>(TRC_FUNC_UINT64, origin, traceId, value);
+    }
+    trace_writer_status append_uint64_2(const trace_origin& origin, uint32_t traceId,
+                                        uint64_t value1, uint64_t value2) {
+        return append_fields<trace_record_uint64_2>(TRC_FUNC_UINT64_2, origin, traceId, value1,
+                                                    value2);
+    }
+    trace_writer_status append_start(const trace_origin& origin, uint32_t traceId, uint32_t pid,
+                                     const cu_timeinfo& timeInfo) {
+        return append_fields<trace_record_start>(TRC_FUNC_START, origin, traceId, pid, timeInfo);
+    }
+    trace_writer_status append_time_calibration(const trace_origin& origin,
+                                                const cu_timeinfo& reBase) {
+        return append_fields<time_calibration>(TRC_FUNC_TIME_CALIBRATION, origin, reBase);
+    }
+    trace_writer_status append_discarded(const trace_origin& origin) {
+        return append(TRC_FUNC_DISCARDED, origin, trace_bytes());
+    }
+
     /// The text is written up to its first NUL, and a NUL added.
     trace_writer_status append_string(const trace_origin& origin, std::string_view text);
     trace_writer_status append_data(const trace_origin& origin, uint32_t traceId,
                                     std::span<const trace_bytes> blocks);
-    trace_writer_status append_int32(const trace_origin& origin, uint32_t traceId, int32_t value);
-    trace_writer_status append_int32_2(const trace_origin& origin, uint32_t traceId, int32_t value1,
-                                       int32_t value2);
-    trace_writer_status append_uint32(const trace_origin& origin, uint32_t traceId, uint32_t value);
-    trace_writer_status append_uint32_2(const trace_origin& origin, uint32_t traceId,
-                                        uint32_t value1, uint32_t value2);
-    trace_writer_status append_int64(const trace_origin& origin, uint32_t traceId, int64_t value);
-    trace_writer_status append_int64_2(const trace_origin& origin, uint32_t traceId, int64_t value1,
-                                       int64_t value2);
-    trace_writer_status append_uint64(const trace_origin& origin, uint32_t traceId, uint64_t value);
-    trace_writer_status append_uint64_2(const trace_origin& origin, uint32_t traceId,
-                                        uint64_t value1, uint64_t value2);
     trace_writer_status append_values(const trace_origin& origin, uint32_t traceId,
                                       std::span<const uint32_t> values);
     trace_writer_status append_values64(const trace_origin& origin, uint32_t traceId,
@@ -199,13 +258,8 @@ public:
     trace_writer_status append_error(const trace_origin& origin, const trace_error_content& error);
     trace_writer_status append_strings(const trace_origin& origin, uint32_t traceId,
                                        std::span<const std::string_view> strings);
-    trace_writer_status append_start(const trace_origin& origin, uint32_t traceId, uint32_t pid,
-                                     const cu_timeinfo& timeInfo);
-    trace_writer_status append_time_calibration(const trace_origin& origin,
-                                                const cu_timeinfo& reBase);
     trace_writer_status append_restart(const trace_origin& origin, uint32_t traceId, uint32_t pid,
                                        const cu_timeinfo& timeInfo, std::string_view text);
-    trace_writer_status append_discarded(const trace_origin& origin);
 
     /// Longest record, header included, that the area can take.
     uint32_t max_record_length() const;
@@ -241,6 +295,14 @@ private:
         uint32_t uGivenUp = 0; ///< records swallowed
     };
 
+    trace_file_header* file_header() const {
+        return reinterpret_cast<trace_file_header*>(pMap);
+    }
+    /// Plain copy of a record's header; only the writer changes headers.
+    trace_record_header header_at(uint32_t uAt) const {
+        return load<trace_record_header>({pMap, uSize}, uAt);
+    }
+
     // trace_writer.cpp: the file
     trace_writer_status make_file(const char* pPath, const trace_writer_options& options);
     void lay_out_file(const trace_writer_options& options);
@@ -263,9 +325,15 @@ private:
     void store_filler(uint32_t uAt, uint32_t uLength);
     void swallow_first_filler();
 
-    // append.cpp: the bodies
-    template <class... T> trace_writer_status
-    append_fields(uint16_t function, const trace_origin& origin, const T&... fields);
+    /// A kind whose body is a row of fields, as the struct of the kind says.
+    template <class RECORD, class... FIELD> trace_writer_status
+    append_fields(uint16_t function, const trace_origin& origin, const FIELD&... fields) {
+        return append(function, origin, trace_body_of(RECORD{{}, fields...}));
+    }
+
+    // append.cpp: the other bodies
+    template <class FILL> trace_writer_status
+    append_filled(uint16_t function, const trace_origin& origin, size_t bodySize, const FILL& fill);
 
     // live.cpp: requests of a reader, and readers that died
     void answer_reader();

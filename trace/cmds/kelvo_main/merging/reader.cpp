@@ -6,7 +6,6 @@
 #include "messages.h"
 #include "mutex.h"
 #include "open.h"
-#include "record_copy.h"
 #include "start.h"
 #include "walk.h"
 
@@ -124,7 +123,7 @@ task_wish reader_step::read() {
     m_state.phase = reader_phase::READS;
     uint32_t uRead = 0;
     while (here == WALK_RECORD && !m_pTraceFile->bDone) {
-        if (is_for_output(m_state.header) &&
+        if (trc_kind_is_output(m_state.header.function) &&
             (m_state.bPassed || start_is_reached(m_pTraceFile, m_state.header))) {
             m_state.bPassed = !number_is_there();
             if (m_state.bPassed)

@@ -198,7 +198,7 @@ void* batch_writer::extend_batch(size_t uSize) {
 bool batch_writer::add(const trace_record_header& header, cu_timeinfo* pBase) {
     const trace_bytes record = record_at_reader(m_pFile->pFile, header);
     const size_t uSize = record.size() + QUEUE_ELEMENT_OVERHEAD;
-    const bool bOwnBase = header.function == TRC_FUNC_START;
+    const bool bOwnBase = trc_kind_has_own_base(header.function);
     void* pRoom = nullptr;
     if (m_pOpen != nullptr && header.timeStamp >= m_pOpen->uLastStamp && !bOwnBase)
         pRoom = extend_batch(uSize);
@@ -215,7 +215,7 @@ bool batch_writer::add(const trace_record_header& header, cu_timeinfo* pBase) {
     ++m_pOpen->uCount;
     ++m_pOpen->uLeft;
     ++m_uCount;
-    if (changes_time_base(header.function)) [[unlikely]] {
+    if (trc_kind_changes_time_base(header.function)) [[unlikely]] {
         *pBase = brought_time_base(pElement);
         if (bOwnBase)
             m_pOpen->base = *pBase;

@@ -69,12 +69,6 @@ inline trace_queue_element* next_element(trace_queue_element* pElement) {
     return reinterpret_cast<trace_queue_element*>(reinterpret_cast<std::byte*>(pElement) + uSize);
 }
 
-/// Whether formatting a record of this kind replaces its file's time base.
-constexpr bool changes_time_base(uint16_t uFunction) {
-    return uFunction == TRC_FUNC_START || uFunction == TRC_FUNC_TIME_CALIBRATION ||
-           uFunction == TRC_FUNC_RESTART;
-}
-
 /// The time base that a record of a kind which changes it brings.
 cu_timeinfo brought_time_base(const trace_queue_element* pElement);
 

@@ -4,11 +4,6 @@
 #include "kelvo.h"
 #include "trace_load.h"
 
-/// Kinds that are handed on for output; the others are only stepped over.
-inline bool is_for_output(const trace_record_header& header) {
-    return header.function >= TRC_FUNC_ID && header.function <= TRC_FUNC_TIME_CALIBRATION;
-}
-
 /// The bytes of the record at pCurRec, whose header was judged as `header`. A
 /// record that ends beyond the mapping is cut there.
 trace_bytes record_at_reader(const trace_file* pTraceFile, const trace_record_header& header);

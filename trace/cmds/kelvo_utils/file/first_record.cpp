@@ -48,13 +48,14 @@ int give_up_at(const ring_search& search) {
     return -1;
 }
 
-/// Time base of a record: a start record brings its own.
+/// Time base of a record: a start record has its own.
 cu_timeinfo time_base(const trace_file* pTraceFile, uint64_t uOffset,
                       const trace_record_header& header) {
     constexpr size_t OWN_BASE = offsetof(trace_record_start, timeInfo);
     const trace_bytes record =
         record_bytes(pTraceFile, ring_position(pTraceFile, uOffset), header.length);
-    if (header.function != TRC_FUNC_START || !lies_inside(record, OWN_BASE, sizeof(cu_timeinfo)))
+    if (!trc_kind_has_own_base(header.function) ||
+        !lies_inside(record, OWN_BASE, sizeof(cu_timeinfo)))
         return pTraceFile->timeInfo;
     return load<cu_timeinfo>(record, OWN_BASE);
 }
@@ -109,13 +110,12 @@ bool oldest_record_time(const trace_file* pTraceFile, cu_nanoseconds* pTime) {
     ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
     while (search.stands_on_record() && !search.has_gone_round()) {
         const trace_record_header header = search.header();
-        if (header.function >= TRC_FUNC_ID && header.function <= TRC_FUNC_TIME_CALIBRATION) {
+        if (trc_kind_is_output(header.function)) {
             *pTime = cu_time_ns(header.timeStamp, time_base(pTraceFile, search.uOffset, header));
             return true;
         }
-        const bool bPassable = is_passed_over(header.function) ||
-                               header.function == TRC_FUNC_RESTART ||
-                               header.function == TRC_FUNC_DISCARDED;
+        const bool bPassable =
+            is_passed_over(header.function) || trc_kind_is_valid(header.function);
         if (!bPassable || header.length < sizeof(trace_record_header))
             return false;
         search.step(header.length);

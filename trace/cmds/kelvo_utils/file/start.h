@@ -19,6 +19,6 @@ int parse_start(const char* pText);
 /// the file corrupt (the warning is written).
 int set_file_start(trace_file* pTraceFile);
 
-/// Whether the record (of function 1 to 17) is output. Changes the file's
+/// Whether the record (of a kind for output) is output. Changes the file's
 /// start state.
 bool start_is_reached(trace_file* pTraceFile, const trace_record_header& header);

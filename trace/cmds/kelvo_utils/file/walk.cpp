@@ -15,16 +15,6 @@
 
 namespace {
 
-bool function_is_valid(uint16_t uFunction) {
-    return uFunction <= TRC_FUNC_TIME_CALIBRATION || uFunction == TRC_FUNC_RESTART ||
-           uFunction == TRC_FUNC_DISCARDED;
-}
-
-/// Kinds whose compId names a component; the other valid ones leave it open.
-bool function_has_component(uint16_t uFunction) {
-    return uFunction >= TRC_FUNC_ID && uFunction <= TRC_FUNC_START;
-}
-
 bool component_is_printable(const char (&compId)[4]) {
     return std::all_of(std::begin(compId), std::end(compId),
                        [](char ch) { return ch >= 0x20 && ch <= 0x7E; });
@@ -112,13 +102,14 @@ trace_bytes record_bytes(const trace_file* pTraceFile, const trace_record_header
 
 int record_is_bad(const trace_record_header* pRec, const trace_record_header& header,
                   const trace_file* pTraceFile) {
-    if (!function_is_valid(header.function)) [[unlikely]] {
+    // Nearly every record has a component: one question tells that it is valid too.
+    if (trc_kind_has_component(header.function)) [[likely]] {
+        if (!component_is_printable(header.compId)) [[unlikely]] {
+            warn_record_component(pTraceFile, get_record_offset(pTraceFile, pRec), header.compId);
+            return 1;
+        }
+    } else if (!trc_kind_is_valid(header.function)) {
         warn_record_function(pTraceFile, get_record_offset(pTraceFile, pRec), header.function);
-        return 1;
-    }
-    if (function_has_component(header.function) && !component_is_printable(header.compId))
-        [[unlikely]] {
-        warn_record_component(pTraceFile, get_record_offset(pTraceFile, pRec), header.compId);
         return 1;
     }
     if (header.length < sizeof(trace_record_header)) [[unlikely]] {

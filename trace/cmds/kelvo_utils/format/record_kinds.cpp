@@ -32,29 +32,29 @@ constexpr parameter_layout STRING_AREA{sizeof(trace_record_strings), 1, 0,
 // clang-format off
 /// Each row stands at its function code.
 constexpr record_kind recordKinds[] = {
-    {TRC_FUNC_FILLER,           "FILLER",           0,  NO_KEY,      nullptr,            NO_DATA},
-    {TRC_FUNC_ID,               "ID",               ID, BODY_KEY,    write_values,       NO_DATA},
-    {TRC_FUNC_STRING,           "STRING",           0,  NO_KEY,      write_string,       NO_DATA},
-    {TRC_FUNC_DATA,             "DATA",             ID, NO_KEY,      write_data,         NO_DATA},
-    {TRC_FUNC_INT32,            "INT32",            ID, BODY_KEY,    write_values,       INT32},
-    {TRC_FUNC_INT32_2,          "INT32_2",          ID, BODY_KEY,    write_values,       INT32_2},
-    {TRC_FUNC_UINT32,           "UINT32",           ID, BODY_KEY,    write_values,       INT32},
-    {TRC_FUNC_UINT32_2,         "UINT32_2",         ID, BODY_KEY,    write_values,       INT32_2},
-    {TRC_FUNC_INT64,            "INT64",            ID, BODY_KEY,    write_values,       INT64},
-    {TRC_FUNC_INT64_2,          "INT64_2",          ID, BODY_KEY,    write_values,       INT64_2},
-    {TRC_FUNC_UINT64,           "UINT64",           ID, BODY_KEY,    write_values,       INT64},
-    {TRC_FUNC_UINT64_2,         "UINT64_2",         ID, BODY_KEY,    write_values,       INT64_2},
-    {TRC_FUNC_VALUES,           "VALUES",           ID, BODY_KEY,    write_value_array,  ARRAY32},
-    {TRC_FUNC_VALUES64,         "VALUES64",         ID, BODY_KEY,    write_value_array,  ARRAY64},
-    {TRC_FUNC_ERROR,            "ERROR",            ID, BODY_KEY,    write_error,        NO_DATA},
-    {TRC_FUNC_STRINGS,          "STRINGS",          ID, BODY_KEY,    write_string_array, STRING_AREA},
-    {TRC_FUNC_START,            "START",            ID, START_KEY,   write_start,        PID},
-    {TRC_FUNC_TIME_CALIBRATION, "TIME_CALIBRATION", 0,  NO_KEY,      nullptr,            NO_DATA},
-    {18,                        nullptr,            0,  NO_KEY,      nullptr,            NO_DATA},
-    {TRC_FUNC_RESTART,          "RESTART",          ID, RESTART_KEY, write_start,        PID},
+    {TRC_FUNC_FILLER,           0,  NO_KEY,      nullptr,            NO_DATA},
+    {TRC_FUNC_ID,               ID, BODY_KEY,    write_values,       NO_DATA},
+    {TRC_FUNC_STRING,           0,  NO_KEY,      write_string,       NO_DATA},
+    {TRC_FUNC_DATA,             ID, NO_KEY,      write_data,         NO_DATA},
+    {TRC_FUNC_INT32,            ID, BODY_KEY,    write_values,       INT32},
+    {TRC_FUNC_INT32_2,          ID, BODY_KEY,    write_values,       INT32_2},
+    {TRC_FUNC_UINT32,           ID, BODY_KEY,    write_values,       INT32},
+    {TRC_FUNC_UINT32_2,         ID, BODY_KEY,    write_values,       INT32_2},
+    {TRC_FUNC_INT64,            ID, BODY_KEY,    write_values,       INT64},
+    {TRC_FUNC_INT64_2,          ID, BODY_KEY,    write_values,       INT64_2},
+    {TRC_FUNC_UINT64,           ID, BODY_KEY,    write_values,       INT64},
+    {TRC_FUNC_UINT64_2,         ID, BODY_KEY,    write_values,       INT64_2},
+    {TRC_FUNC_VALUES,           ID, BODY_KEY,    write_value_array,  ARRAY32},
+    {TRC_FUNC_VALUES64,         ID, BODY_KEY,    write_value_array,  ARRAY64},
+    {TRC_FUNC_ERROR,            ID, BODY_KEY,    write_error,        NO_DATA},
+    {TRC_FUNC_STRINGS,          ID, BODY_KEY,    write_string_array, STRING_AREA},
+    {TRC_FUNC_START,            ID, START_KEY,   write_start,        PID},
+    {TRC_FUNC_TIME_CALIBRATION, 0,  NO_KEY,      nullptr,            NO_DATA},
+    {18,                        0,  NO_KEY,      nullptr,            NO_DATA},
+    {TRC_FUNC_RESTART,          ID, RESTART_KEY, write_start,        PID},
 };
 constexpr record_kind discardedKind =
-    {TRC_FUNC_DISCARDED,        "DISCARDED",        0,  NO_KEY,      write_discarded,    NO_DATA};
+    {TRC_FUNC_DISCARDED,        0,  NO_KEY,      write_discarded,    NO_DATA};
 // clang-format on
 
 constexpr bool rows_stand_at_their_code() {
@@ -66,6 +66,21 @@ constexpr bool rows_stand_at_their_code() {
 }
 static_assert(rows_stand_at_their_code());
 
+constexpr const record_kind* row_of(uint16_t uFunction) {
+    if (uFunction < std::size(recordKinds))
+        return &recordKinds[uFunction];
+    return uFunction == TRC_FUNC_DISCARDED ? &discardedKind : nullptr;
+}
+
+constexpr bool every_kind_has_a_row() {
+    for (const trc_kind& kind : TRC_KINDS) {
+        if (trc_kind_is_valid(kind.function) && row_of(kind.function) == nullptr)
+            return false;
+    }
+    return true;
+}
+static_assert(every_kind_has_a_row());
+
 // One offset serves all bodies: it is where every kind keeps its trace id.
 static_assert(offsetof(trace_record_data, trace_id) == ID &&
               offsetof(trace_record_int32, trace_id) == ID &&
@@ -76,9 +91,7 @@ static_assert(offsetof(trace_record_data, trace_id) == ID &&
 } // namespace
 
 const record_kind* find_record_kind(uint16_t uFunction) {
-    if (uFunction < std::size(recordKinds))
-        return recordKinds[uFunction].pName ? &recordKinds[uFunction] : nullptr;
-    return uFunction == TRC_FUNC_DISCARDED ? &discardedKind : nullptr;
+    return trc_kind_is_valid(uFunction) ? row_of(uFunction) : nullptr;
 }
 
 uint32_t element_count(const record_view& record) {

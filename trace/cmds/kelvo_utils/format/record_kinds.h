@@ -1,6 +1,6 @@
-// The kinds of records: one row per kind says where its parts lie, under which
-// trace id its template is looked up and how it is written. A new kind is one
-// row here and a writer in record_bodies.h.
+// The kinds of records as text: one row per kind says where its parts lie, under
+// which trace id its template is looked up and how it is written. What else
+// holds of a kind stands in TRC_KINDS.
 #pragma once
 
 #include "record_view.h"
@@ -28,8 +28,7 @@ struct parameter_layout {
 /// One row of the table. Offsets and lengths are in bytes from the start of
 /// the record, header included.
 struct record_kind {
-    uint16_t uFunction; ///< a trace_function
-    const char* pName;
+    uint16_t uFunction;      ///< a trace_function
     uint32_t uTraceIdOffset; ///< 0: the body has no trace id
     int iTemplateKey;        ///< a trace id or TEMPLATE_KEY_*
     record_writer pWriter;   ///< null: never written
