@@ -151,14 +151,14 @@ void take_record(reading& run, const trace_record_header& header) {
 /// Where a walk stands.
 struct walk_state {
     trace_record_header* pCurRec;
+    uint32_t uExpectedSeq;
     uint32_t uSeqLock;
-    uint64_t uUncountedBytes;
 
     friend bool operator==(const walk_state&, const walk_state&) = default;
 };
 
 walk_state state_of(const trace_file* pTraceFile) {
-    return {pTraceFile->pCurRec, load_seq_lock(pTraceFile->pHeader), pTraceFile->uUncountedBytes};
+    return {pTraceFile->pCurRec, pTraceFile->uExpectedSeq, pTraceFile->pHeader->uSeqLock};
 }
 
 /// The step as the reader makes it, held against that by the plain operations.
@@ -171,8 +171,7 @@ walk_result step(trace_file* pTraceFile, trace_record_header* pHeader) {
     const walk_state behind = state_of(pTraceFile);
 
     pTraceFile->pCurRec = before.pCurRec;
-    store_seq_lock(pTraceFile->pHeader, before.uSeqLock);
-    pTraceFile->uUncountedBytes = before.uUncountedBytes;
+    pTraceFile->uExpectedSeq = before.uExpectedSeq;
     const walk_result result = step_and_judge(pTraceFile, pHeader);
     hostile_check(result == plain && state_of(pTraceFile) == behind,
                   "both ways of stepping lead to the same place");
@@ -186,8 +185,8 @@ bool is_taken(const reading& run, const trace_record_header& header) {
 
 hostile_end walk(reading& run) {
     trace_file* const pTraceFile = run.pTraceFile;
-    // What is left of the first turn, and one more when the oldest position
-    // holds a filler whose number happens to be the next one.
+    // What is left of the first turn, and one more when the number at the oldest
+    // position happens to be the next one.
     uint64_t uStepsLeft = 2 * (ring_size(pTraceFile) / sizeof(trace_record_header)) + 2;
     trace_record_header header;
     walk_result here = is_last_record(pTraceFile, &header);

@@ -19,6 +19,7 @@ public:
         file.pMapEnd = ring_position(&file, file.uSize);
         file.pWrap = ring_position(&file, trace.header.uOffset);
         file.pCurRec = file.pWrap;
+        file.uExpectedSeq = trace.header.uSeqLock;
         file.timeInfo = trace.header.timeInfo;
         file.uPlatform = trace.header.uPlatform;
     }

@@ -138,7 +138,7 @@ struct trace_file {
     trace_record_header* pMapEnd; ///< end of the mapping; null when not mapped
     trace_record_header* pWrap;   ///< start of the record area; null when not mapped
     alignas(CACHE_LINE) trace_record_header* pCurRec; ///< where the reader stands
-    uint64_t uUncountedBytes;   ///< bytes walked since a record last counted in the sequence
+    uint32_t uExpectedSeq;      ///< number of the next record in sequence, uSeqLock for the writer
     alignas(CACHE_LINE) int fd; ///< -1 when closed
     uint32_t uSize;             ///< bytes mapped
     int index;                  ///< position among the file arguments, from 0

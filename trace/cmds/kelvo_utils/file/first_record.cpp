@@ -23,8 +23,10 @@ struct ring_search {
         return read_record_header(ring_position(pTraceFile, uOffset));
     }
 
-    bool stands_on_oldest() const {
-        return uOffset == load_oldest_record_offset(pTraceFile->pHeader);
+    /// Back where the search began. The oldest position may be elsewhere by now: a
+    /// writer that made it begin on an unfinished record has finished that one.
+    bool is_back() const {
+        return uWalked == ring_size(pTraceFile);
     }
 
     bool has_gone_round() const {
@@ -39,8 +41,16 @@ struct ring_search {
     }
 };
 
-bool is_passed_over(uint16_t uFunction) {
-    return uFunction == TRC_FUNC_FILLER || uFunction == TRC_FUNC_WRITING;
+/// Fillers and what is just being written: held records, and the newest record
+/// while it stands on the oldest position and waits for its number.
+bool is_passed_over(const trace_record_header& header) {
+    return header.function == TRC_FUNC_FILLER || header.function == TRC_FUNC_WRITING ||
+           header.seqNumber == TRC_SEQ_FILLER;
+}
+
+void stand_on(trace_file* pTraceFile, const trace_record_header& header) {
+    pTraceFile->uExpectedSeq = header.seqNumber;
+    store_seq_lock(pTraceFile->pHeader, header.seqNumber);
 }
 
 int give_up_at(const ring_search& search) {
@@ -74,16 +84,14 @@ void release_tail(trace_file* pTraceFile) {
 }
 
 int find_first_record(trace_file* pTraceFile) {
-    trace_file_header* const pHeader = pTraceFile->pHeader;
-    ring_search search{pTraceFile, load_oldest_record_offset(pHeader)};
+    ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
     pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);
-    pTraceFile->uUncountedBytes = 0;
     if (!search.stands_on_record())
         return give_up_at(search);
     trace_record_header header = search.header();
-    store_seq_lock(pHeader, header.seqNumber);
+    stand_on(pTraceFile, header);
 
-    while (is_passed_over(header.function)) {
+    while (is_passed_over(header)) {
         if (header.length < sizeof(trace_record_header)) {
             warn_record_length(pTraceFile, static_cast<uint32_t>(search.uOffset), header.length);
             return -1;
@@ -92,12 +100,12 @@ int find_first_record(trace_file* pTraceFile) {
         pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);
         if (!search.stands_on_record())
             return give_up_at(search);
-        if (search.stands_on_oldest())
+        if (search.is_back())
             return 0;
         if (search.has_gone_round())
             return give_up_at(search);
         header = search.header();
-        store_seq_lock(pHeader, header.seqNumber);
+        stand_on(pTraceFile, header);
         cu_cvt_time_platform_1(header.timeStamp, &pTraceFile->timeInfo, &pTraceFile->modTime,
                                pTraceFile->uPlatform);
         pTraceFile->timeStampIsValid = 1;
@@ -109,12 +117,13 @@ bool oldest_record_time(const trace_file* pTraceFile, cu_nanoseconds* pTime) {
     ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
     while (search.stands_on_record() && !search.has_gone_round()) {
         const trace_record_header header = search.header();
-        if (header.function >= TRC_FUNC_ID && header.function <= TRC_FUNC_TIME_CALIBRATION) {
+        const bool bPassedOver = is_passed_over(header);
+        if (!bPassedOver && header.function >= TRC_FUNC_ID &&
+            header.function <= TRC_FUNC_TIME_CALIBRATION) {
             *pTime = cu_time_ns(header.timeStamp, time_base(pTraceFile, search.uOffset, header));
             return true;
         }
-        const bool bPassable = is_passed_over(header.function) ||
-                               header.function == TRC_FUNC_RESTART ||
+        const bool bPassable = bPassedOver || header.function == TRC_FUNC_RESTART ||
                                header.function == TRC_FUNC_DISCARDED;
         if (!bPassable || header.length < sizeof(trace_record_header))
             return false;

@@ -44,11 +44,6 @@ inline void store_tail_request(trace_file_header* pHeader, uint32_t uTailReq) {
     __atomic_store_n(&pHeader->uTailReq, uTailReq, __ATOMIC_SEQ_CST);
 }
 
-/// The reader's own word: no order is needed to read it back.
-inline uint32_t load_seq_lock(const trace_file_header* pHeader) {
-    return __atomic_load_n(&pHeader->uSeqLock, __ATOMIC_RELAXED);
-}
-
 inline void store_seq_lock(trace_file_header* pHeader, uint32_t uSeqLock) {
     __atomic_store_n(&pHeader->uSeqLock, uSeqLock, __ATOMIC_RELEASE);
 }

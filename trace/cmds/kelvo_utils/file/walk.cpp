@@ -35,15 +35,12 @@ bool counts_in_sequence(const trace_record_header& header) {
 }
 
 /// Whether the reader, standing on the oldest position, has read all there is:
-/// the record is not the next one in sequence, or it is the first of a whole
-/// turn of fillers, which have no place in the sequence and would let the walk
-/// go round for ever. A record that counts is judged by its seqNumber alone, so
-/// that a writer which goes on after such a turn is noticed.
+/// the record is not the next one in sequence. A gap filler never is, though the
+/// numbers of the sequence may happen to reach its own: the ring would be read
+/// again, and one of fillers alone without end.
 bool has_caught_up(const trace_file* pTraceFile, const trace_record_header& header) {
-    if (header.seqNumber != load_seq_lock(pTraceFile->pHeader) ||
-        header.function == TRC_FUNC_WRITING)
-        return true;
-    return !counts_in_sequence(header) && pTraceFile->uUncountedBytes >= ring_size(pTraceFile);
+    return header.seqNumber != pTraceFile->uExpectedSeq || header.function == TRC_FUNC_WRITING ||
+           !counts_in_sequence(header);
 }
 
 /// What is_last_record says of the sound record at pCurRec. `uOldest` was read
@@ -85,14 +82,20 @@ void fetch_ahead(const trace_file* pTraceFile) {
     __builtin_prefetch(ring_position(pTraceFile, uAhead));
 }
 
-/// Lets the writer know that the record was passed.
+/// Lets the writer know where the reader stands. Stored whole and at every step:
+/// whatever somebody else stored in the word is gone with the next one.
+void tell_writer(const trace_file* pTraceFile) {
+    store_seq_lock(pTraceFile->pHeader, pTraceFile->uExpectedSeq);
+}
+
+/// A ring of gap fillers has shown the reader no number; the first record does.
 void count_as_passed(trace_file* pTraceFile, const trace_record_header& passed) {
-    if (counts_in_sequence(passed)) {
-        pTraceFile->uUncountedBytes = 0;
-        store_seq_lock(pTraceFile->pHeader, load_seq_lock(pTraceFile->pHeader) + 2);
-    } else {
-        pTraceFile->uUncountedBytes += passed.length;
+    if (counts_in_sequence(passed)) [[likely]] {
+        if (pTraceFile->uExpectedSeq == TRC_SEQ_FILLER) [[unlikely]]
+            pTraceFile->uExpectedSeq = passed.seqNumber;
+        pTraceFile->uExpectedSeq += 2;
     }
+    tell_writer(pTraceFile);
 }
 
 } // namespace
@@ -149,6 +152,7 @@ walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pH
     const uint32_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
     if (current_record_pointer_is_bad(pTraceFile, pHeader))
         return WALK_CORRUPT;
+    tell_writer(pTraceFile);
     return judge_position(pTraceFile, uOldest, *pHeader);
 }
 
@@ -173,7 +177,8 @@ walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_heade
     return WALK_RECORD;
 }
 
-walk_result step_and_judge(trace_file* pTraceFile, trace_record_header* pHeader) {
+// Once a record: with everything in place, the warnings apart, which are cold.
+[[gnu::flatten]] walk_result step_and_judge(trace_file* pTraceFile, trace_record_header* pHeader) {
     const trace_record_header passed = *pHeader;
     move_past(pTraceFile, passed);
     fetch_ahead(pTraceFile);
