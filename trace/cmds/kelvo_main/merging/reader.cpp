@@ -174,7 +174,7 @@ task_wish reader_step::close() {
         const mutex_guard guard(ctrl.priorityQmutex);
         file_was_read();
     }
-    close_trace_file(m_pTraceFile, 0);
+    close_trace_file(m_pTraceFile);
     say("Closed", m_pTraceFile);
     const mutex_guard guard(ctrl.priorityQmutex);
     file_stops_running(m_file);

@@ -1,6 +1,7 @@
 #include "first_record.h"
 
 #include "corruption.h"
+#include "reader_words.h"
 #include "ring.h"
 #include "shared_words.h"
 #include "walk.h"
@@ -50,7 +51,7 @@ bool is_passed_over(const trace_record_header& header) {
 
 void stand_on(trace_file* pTraceFile, const trace_record_header& header) {
     pTraceFile->uExpectedSeq = header.seqNumber;
-    store_seq_lock(pTraceFile->pHeader, header.seqNumber);
+    tell_place_now(pTraceFile);
 }
 
 int give_up_at(const ring_search& search) {
@@ -72,15 +73,15 @@ cu_timeinfo time_base(const trace_file* pTraceFile, uint64_t uOffset,
 } // namespace
 
 void request_tail(trace_file* pTraceFile) {
-    store_tail_request(pTraceFile->pHeader, TRC_TAIL_REQUESTED);
+    raise_tail_request(pTraceFile);
 }
 
 bool tail_is_kept(const trace_file* pTraceFile) {
-    return tail_request_is_acknowledged(pTraceFile->pHeader);
+    return pTraceFile->bReadOnly || tail_request_is_acknowledged(pTraceFile->pHeader);
 }
 
 void release_tail(trace_file* pTraceFile) {
-    store_tail_request(pTraceFile->pHeader, 0);
+    lower_tail_request(pTraceFile);
 }
 
 int find_first_record(trace_file* pTraceFile) {

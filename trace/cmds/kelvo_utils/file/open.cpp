@@ -1,20 +1,19 @@
 #include "open.h"
 
 #include "accept.h"
-#include "insufficient.h"
 #include "mapping.h"
-#include "messages.h"
-#include "mutex.h"
+#include "open_result.h"
 #include "print.h"
 #include "start.h"
 #include "summary.h"
+#include "twins.h"
 #include "usage.h"
 
+#include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
 #include <new>
-#include <unistd.h>
 
 namespace {
 
@@ -23,18 +22,11 @@ constexpr uint16_t VERSION_WITH_BASE_PROG_NAME = 5;
 /// A file that is not handed out is closed and released.
 struct file_closer {
     void operator()(trace_file* pTraceFile) const {
-        close_trace_file(pTraceFile, 0);
+        close_trace_file(pTraceFile);
         release_trace_file(pTraceFile);
     }
 };
 using trace_file_ptr = std::unique_ptr<trace_file, file_closer>;
-
-struct block_freer {
-    void operator()(void* pBlock) const {
-        free(pBlock);
-    }
-};
-using header_copy_ptr = std::unique_ptr<trace_file_header, block_freer>;
 
 /// The record and, behind it in the same block, its path. Null when memory ran
 /// out (reported).
@@ -44,29 +36,18 @@ trace_file_ptr make_trace_file(const char* pName) {
     const size_t uSize = (sizeof(trace_file) + uNameSize + ALIGNMENT - 1) / ALIGNMENT * ALIGNMENT;
     void* const pBlock = aligned_alloc(ALIGNMENT, uSize);
     if (pBlock == nullptr) {
-        warn_insufficient_resources_during_open(pName, static_cast<int64_t>(uSize));
+        report_open_failure(pName, {OPEN_NO_MEMORY, ENOMEM, static_cast<int64_t>(uSize)});
         return nullptr;
     }
     trace_file_ptr pTraceFile(new (pBlock) trace_file{});
     pTraceFile->pName = static_cast<char*>(pBlock) + sizeof(trace_file);
     memcpy(pTraceFile->pName, pName, uNameSize);
     pTraceFile->fd = -1;
-    trc_init_recursive_mutex(&pTraceFile->queueMutex);
     return pTraceFile;
 }
 
-header_copy_ptr make_header_copy(const char* pName, const trace_file_header& header) {
-    void* const pBlock = malloc(sizeof(header));
-    if (pBlock == nullptr) {
-        warn_insufficient_resources_during_open(pName, sizeof(header));
-        return nullptr;
-    }
-    return header_copy_ptr(new (pBlock) trace_file_header(header));
-}
-
-int not_a_trace_file(const char* pName) {
-    output_err_message("%s: 2625-107 File \"%s\" is not a valid trace file.\n", anchor.pProgName,
-                       pName);
+int refuse(const char* pName, const open_result& result) {
+    report_open_failure(pName, result);
     return -1;
 }
 
@@ -94,16 +75,20 @@ int apply_first_file(const trace_file_header& header) {
     return 0;
 }
 
-/// Gives mapping, descriptor and lock back until the file is read; the header
-/// copy takes the mapping's place.
-void park(trace_file* pTraceFile, header_copy_ptr pCopy) {
+/// Gives mapping, descriptor and lock back until the file is read.
+void park(trace_file* pTraceFile) {
     unmap_trace_file(pTraceFile);
-    pTraceFile->pHeader = pCopy.release();
-    close(pTraceFile->fd);
-    pTraceFile->fd = -1;
+    close_descriptor(pTraceFile);
 }
 
 } // namespace
+
+int open_lock_map_trace_file(trace_file* pTraceFile) {
+    pTraceFile->bTellsSeldom = pTraceFile->bReadOnly || pTraceFile->pTwins != nullptr;
+    const open_result result =
+        pTraceFile->pTwins != nullptr ? open_among_twins(pTraceFile) : open_alone(pTraceFile);
+    return result.eOutcome == OPEN_OK ? 0 : refuse(pTraceFile->pName, result);
+}
 
 int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrElem* pElem,
                     int bPrBaseProgName, unsigned int total_files, unsigned int fileIndex) {
@@ -117,14 +102,13 @@ int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrEl
     trace_file_header header; // the writer may change the mapped one at any time
     memcpy(&header, pTraceFile->pHeader, sizeof(header));
     if (!header_is_valid(header, pTraceFile->uSize))
-        return not_a_trace_file(pName);
+        return refuse(pName, {OPEN_NO_TRACE_FILE});
     if (bPrBaseProgName)
         return list_base_program_name(header);
-    header_copy_ptr pCopy = make_header_copy(pName, header);
-    if (pCopy == nullptr)
-        return -1;
     if (!record_area_is_usable(pTraceFile.get()))
-        return not_a_trace_file(pName);
+        return refuse(pName, {OPEN_NO_TRACE_FILE});
+    if (!join_twins(pTraceFile.get()))
+        return refuse(pName, {OPEN_NO_MEMORY, ENOMEM, SIZE_OF_TWINS});
     pTraceFile->bAccepted = 1;
 
     take_header(pTraceFile.get(), header, pElem);
@@ -132,7 +116,7 @@ int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrEl
     if (fileIndex == 0 && apply_first_file(header) != 0)
         return -1;
     if (!anchor.bFollow)
-        park(pTraceFile.get(), std::move(pCopy));
+        park(pTraceFile.get());
     *ppTraceFile = pTraceFile.release();
     return 0;
 }

@@ -10,8 +10,7 @@
 
 /// Opens one file argument: prints its header summary, applies the first file's
 /// time zone and start argument, and hands the new record out. Outside follow
-/// mode the file comes back parked: unmapped, unlocked, closed, with a private
-/// copy of its header in pHeader (a malloc block). Main thread.
+/// mode the file comes back parked: unmapped, unlocked and closed. Main thread.
 ///
 /// `pElem` receives the header of the first record of the record area and,
 /// outside follow mode, the converted time of the oldest record (bOldestKnown,
@@ -26,19 +25,20 @@ int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrEl
 
 /// Opens, locks (unless -z) and maps the file: fd, uSize, pHeader, pMapEnd and
 /// pWrap, all taken afresh; the header is not validated, so pWrap may lie
-/// anywhere. A parked header copy is released first. Returns 0, or -1 after a
-/// message; the descriptor then stays in fd for close_trace_file, and nothing
-/// is mapped. Never waits, whatever kind of file the path names. Any thread.
+/// anywhere. A parked file must be the one that was parked; twins share what the
+/// first of them opens. Returns 0, or -1 after a message; then nothing stays open.
+/// Never waits, whatever kind of file the path names, but for the holder of a lease
+/// on it. Any thread.
 int open_lock_map_trace_file(trace_file* pTraceFile);
 
-/// Releases mapping (or parked header copy), descriptor, lock and per-file
-/// lists; lowers uTailReq and ends uSeqLock in a file that was accepted, and
-/// sets the file's times when modTime holds one. The record itself stays. With
-/// `bSigActive` memory is left alone. May be called again. Any thread; nobody
-/// else may be using the file.
-void close_trace_file(trace_file* pTraceFile, int bSigActive);
+/// Releases mapping, descriptor, lock and per-file lists; lowers uTailReq and ends
+/// uSeqLock in a file that was accepted, and sets the file's times when modTime
+/// holds one: of twins the last that closes does that. The record itself stays. May
+/// be called again. Any thread; nobody else may be using the record.
+void close_trace_file(trace_file* pTraceFile);
 
-/// Releases a closed or parked record that is in no list. Null is allowed.
+/// Releases a closed or parked record that is in no list. Null is allowed. Main
+/// thread.
 void release_trace_file(trace_file* pTraceFile);
 
 /// Sets TZ from anchor.tz_offset, for all later local-time conversions of the

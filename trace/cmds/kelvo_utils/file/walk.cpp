@@ -9,6 +9,7 @@
 #include "walk.h"
 
 #include "corruption.h"
+#include "reader_words.h"
 #include "ring.h"
 
 #include <algorithm>
@@ -82,12 +83,6 @@ void fetch_ahead(const trace_file* pTraceFile) {
     __builtin_prefetch(ring_position(pTraceFile, uAhead));
 }
 
-/// Lets the writer know where the reader stands. Stored whole and at every step:
-/// whatever somebody else stored in the word is gone with the next one.
-void tell_writer(const trace_file* pTraceFile) {
-    store_seq_lock(pTraceFile->pHeader, pTraceFile->uExpectedSeq);
-}
-
 /// A ring of gap fillers has shown the reader no number; the first record does.
 void count_as_passed(trace_file* pTraceFile, const trace_record_header& passed) {
     if (counts_in_sequence(passed)) [[likely]] {
@@ -95,7 +90,7 @@ void count_as_passed(trace_file* pTraceFile, const trace_record_header& passed) 
             pTraceFile->uExpectedSeq = passed.seqNumber;
         pTraceFile->uExpectedSeq += 2;
     }
-    tell_writer(pTraceFile);
+    tell_place(pTraceFile);
 }
 
 } // namespace
@@ -148,11 +143,11 @@ int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_hea
     return 0;
 }
 
-walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader) {
+walk_result is_last_record(trace_file* pTraceFile, trace_record_header* pHeader) {
     const uint32_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
     if (current_record_pointer_is_bad(pTraceFile, pHeader))
         return WALK_CORRUPT;
-    tell_writer(pTraceFile);
+    tell_place_now(pTraceFile);
     return judge_position(pTraceFile, uOldest, *pHeader);
 }
 

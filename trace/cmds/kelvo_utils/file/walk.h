@@ -48,7 +48,7 @@ enum walk_result : int {
 /// Whether a record can be read at pCurRec; fills `pHeader` with the copy of
 /// its header that was judged and is to be worked on. May be asked again at the
 /// same position any number of times; stores uSeqLock anew each time.
-walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader);
+walk_result is_last_record(trace_file* pTraceFile, trace_record_header* pHeader);
 
 /// Whether the record at pCurRec, found readable and copied to `pHeader`, has
 /// its seqNumber: the writer stores it a moment after the record can be read.
