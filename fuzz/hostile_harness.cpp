@@ -50,16 +50,6 @@ byte_block copy_of(trace_bytes bytes) {
     return byte_block(pBlock);
 }
 
-/// Fills in what opening and mapping fill in.
-void map_over(trace_file* pTraceFile, std::byte* pBytes, trace_bytes original) {
-    pTraceFile->pName = fileName;
-    pTraceFile->fd = -1;
-    pTraceFile->uSize = static_cast<uint32_t>(original.size());
-    pTraceFile->pHeader = reinterpret_cast<trace_file_header*>(pBytes);
-    pTraceFile->pMapEnd = ring_position(pTraceFile, pTraceFile->uSize);
-    pTraceFile->pWrap = ring_position(pTraceFile, pTraceFile->pHeader->uOffset);
-}
-
 /// The checks and the summary of the opening. Returns whether it would succeed.
 bool open_file(trace_file* pTraceFile, const trace_file_header& header) {
     pTraceFile->timeInfo = header.timeInfo;
@@ -276,7 +266,9 @@ hostile_result read_hostile_file(trace_bytes bytes, const hostile_options& optio
         return result;
     const byte_block pBytes = copy_of(bytes);
     trace_file file{};
-    map_over(&file, pBytes.get(), bytes);
+    file.pName = fileName;
+    file.fd = -1;
+    ring_map_over(&file, pBytes.get(), bytes.size());
     const auto header = load<trace_file_header>(bytes, 0);
     file.addrMode64 = (header.uProperties & TRC_PROP_ADDR_64) != 0;
     result.bAccepted = open_file(&file, header);

@@ -8,7 +8,7 @@
 #include "merge.h"
 #include "messages.h"
 #include "mutex.h"
-#include "open.h"
+#include "opening.h"
 #include "pool.h"
 #include "print.h"
 #include "progress.h"

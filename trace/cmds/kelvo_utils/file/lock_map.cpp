@@ -67,9 +67,7 @@ open_result map_file(trace_file* pTraceFile, uint64_t uFileSize) {
     if (pMapping == MAP_FAILED)
         return {OPEN_NO_MEMORY, errno, pTraceFile->uSize};
     pTraceFile->uMappedSize = uFileSize;
-    pTraceFile->pHeader = static_cast<trace_file_header*>(pMapping);
-    pTraceFile->pMapEnd = ring_position(pTraceFile, pTraceFile->uSize);
-    pTraceFile->pWrap = ring_position(pTraceFile, pTraceFile->pHeader->uOffset);
+    ring_map_over(pTraceFile, pMapping, uFileSize);
     return {};
 }
 

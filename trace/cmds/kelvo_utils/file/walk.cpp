@@ -68,10 +68,8 @@ walk_result judge_position(const trace_file* pTraceFile, uint32_t uOldest,
 
 /// Moves pCurRec past the record; the new position is not yet tested.
 void move_past(trace_file* pTraceFile, const trace_record_header& current) {
-    uint64_t uNext = ring_offset(pTraceFile, pTraceFile->pCurRec) + current.length;
-    if (uNext == ring_end(pTraceFile))
-        uNext = ring_start(pTraceFile);
-    pTraceFile->pCurRec = ring_position(pTraceFile, uNext);
+    const uint64_t uOffset = ring_offset(pTraceFile, pTraceFile->pCurRec);
+    pTraceFile->pCurRec = ring_position(pTraceFile, ring_next(pTraceFile, uOffset, current.length));
 }
 
 /// Has the processor fetch what will be read some records later: its own
@@ -157,10 +155,9 @@ bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader)
     // The number stands there once the offset has moved beyond the next record.
     const uint64_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
     pHeader->seqNumber = read_record_header(pTraceFile->pCurRec).seqNumber;
-    uint64_t uEnd = ring_offset(pTraceFile, pTraceFile->pCurRec) + pHeader->length;
-    if (uEnd == ring_end(pTraceFile))
-        uEnd = ring_start(pTraceFile);
-    return pHeader->seqNumber != TRC_SEQ_FILLER || uEnd != uOldest;
+    const uint64_t uOffset = ring_offset(pTraceFile, pTraceFile->pCurRec);
+    return pHeader->seqNumber != TRC_SEQ_FILLER ||
+           ring_next(pTraceFile, uOffset, pHeader->length) != uOldest;
 }
 
 walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current) {

@@ -1,4 +1,4 @@
-#include "open.h"
+#include "opening.h"
 
 #include "first_record.h"
 #include "identity.h"
@@ -386,18 +386,20 @@ TEST_F(Open, follows_one_file_once_and_keeps_its_lock) {
 
 TEST_F(Open, stores_nothing_in_a_file_that_is_only_read) {
     const raw_trace raw = sound_trace();
-    const opened file = open_file(raw);
-    trace_file* const pFile = file.pFile;
+    ASSERT_TRUE(raw.write(path));
     const timespec before = modification_time();
-    pFile->bReadOnly = true;
-    ASSERT_EQ(open_lock_map_trace_file(pFile), 0);
+    trace_file_ptr pFile;
+    trace_file_header header;
+    TrcPreProcHdrElem elem{};
+    ASSERT_EQ(open_checked_file(path.c_str(), true, &pFile, &header).eOutcome, OPEN_OK);
+    ASSERT_EQ(accept_trace_file(pFile.get(), header, &elem).eOutcome, OPEN_OK);
     EXPECT_FALSE(is_locked());
-    raise_tail_request(pFile);
-    EXPECT_EQ(find_first_record(pFile), 0);
-    EXPECT_EQ(read_all(pFile), 1);
+    raise_tail_request(pFile.get());
+    EXPECT_EQ(find_first_record(pFile.get()), 0);
+    EXPECT_EQ(read_all(pFile.get()), 1);
     pFile->pHeader->uSeqLock = 4711; // whoever stores all the same
     pFile->timeStampIsValid = 1;
-    end(file);
+    pFile = nullptr;
     EXPECT_TRUE(read_file(path) == raw.bytes());
     EXPECT_EQ(modification_time().tv_nsec, before.tv_nsec);
 }
