@@ -121,15 +121,12 @@ struct thread_info {
 struct trace_queue_element;
 struct trace_twins;
 
-/// Which file this is, whatever path names it. The inode of a file that is removed may
-/// be given to the next one that is made; the time of birth tells the two apart.
+/// Which file this is, whatever path names it: see is_same_file.
 struct file_identity {
     uint64_t uDevice;
     uint64_t uInode;
     int64_t iBornSeconds; ///< 0 where the file system does not know
     uint32_t uBornNanoSeconds;
-
-    friend bool operator==(const file_identity&, const file_identity&) = default;
 };
 
 /// One trace file of the run. Made in one block with its path, all zero but fd.

@@ -68,6 +68,13 @@ void grow_table() {
 
 } // namespace
 
+bool is_same_file(const file_identity& a, const file_identity& b) {
+    const bool bBirthsKnown = a.iBornSeconds != 0 && b.iBornSeconds != 0;
+    return a.uDevice == b.uDevice && a.uInode == b.uInode &&
+           (!bBirthsKnown ||
+            (a.iBornSeconds == b.iBornSeconds && a.uBornNanoSeconds == b.uBornNanoSeconds));
+}
+
 bool status_of_path(const char* pName, file_status* pStatus) {
     return get_status(AT_FDCWD, pName, 0, pStatus);
 }
@@ -78,7 +85,7 @@ bool status_of_descriptor(int fd, file_status* pStatus) {
 
 trace_file* find_accepted_file(const file_identity& identity) {
     trace_file* pTraceFile = *chain_of(identity);
-    while (pTraceFile != nullptr && pTraceFile->identity != identity)
+    while (pTraceFile != nullptr && !is_same_file(pTraceFile->identity, identity))
         pTraceFile = pTraceFile->pNextInTable;
     return pTraceFile;
 }

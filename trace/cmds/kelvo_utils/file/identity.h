@@ -12,6 +12,10 @@ struct file_status {
     bool bRegular; ///< what is not has no size that counts
 };
 
+/// The inode of a file that is removed may be given to the next one that is made; the
+/// time of birth, where it is known, tells the two apart.
+bool is_same_file(const file_identity& a, const file_identity& b);
+
 /// Of what the path names; nothing is opened. False with errno.
 bool status_of_path(const char* pName, file_status* pStatus);
 

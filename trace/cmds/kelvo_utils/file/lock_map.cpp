@@ -21,7 +21,7 @@ struct taken_status {
 /// descriptor of one of them would drop its lock.
 open_outcome judge_identity(const trace_file* pTraceFile, const file_identity& identity) {
     if (pTraceFile->bAccepted)
-        return identity == pTraceFile->identity ? OPEN_OK : OPEN_REPLACED;
+        return is_same_file(identity, pTraceFile->identity) ? OPEN_OK : OPEN_REPLACED;
     return anchor.bFollow && find_accepted_file(identity) != nullptr ? OPEN_IN_USE : OPEN_OK;
 }
 

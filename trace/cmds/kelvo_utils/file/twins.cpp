@@ -92,7 +92,7 @@ open_result share_mapping(trace_file* pTraceFile, const trace_file* pTwin) {
     file_status status;
     if (!status_of_path(pTraceFile->pName, &status))
         return {OPEN_REFUSED, errno};
-    if (status.identity != pTraceFile->identity)
+    if (!is_same_file(status.identity, pTraceFile->identity))
         return {OPEN_REPLACED};
     share_open_file(pTraceFile, pTwin);
     return {};
