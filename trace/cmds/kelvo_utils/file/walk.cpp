@@ -131,7 +131,7 @@ int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_hea
         warn_out_of_bounds(pTraceFile, pRec);
         return 1;
     }
-    *pHeader = read_record_header(pRec);
+    load_record_header(pRec, pHeader);
     if (record_is_bad(pRec, *pHeader, pTraceFile))
         return 1;
     if (ring_covers_reader_words(uOffset)) [[unlikely]] {

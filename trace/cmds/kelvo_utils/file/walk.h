@@ -20,7 +20,9 @@ uint32_t get_record_offset(const trace_file* pTraceFile, const trace_record_head
 /// A copy of the header at `pRec`, each word read once. `pRec` must leave 28
 /// bytes before pMapEnd.
 inline trace_record_header read_record_header(const trace_record_header* pRec) {
-    return load_record_header(pRec);
+    trace_record_header header;
+    load_record_header(pRec, &header);
+    return header;
 }
 
 /// The bytes of the record at `pRec` whose length field was read as `length`:
