@@ -50,16 +50,6 @@ byte_block copy_of(trace_bytes bytes) {
     return byte_block(pBlock);
 }
 
-/// Fills in what opening and mapping fill in.
-void map_over(trace_file* pTraceFile, std::byte* pBytes, trace_bytes original) {
-    pTraceFile->pName = fileName;
-    pTraceFile->fd = -1;
-    pTraceFile->uSize = static_cast<uint32_t>(original.size());
-    pTraceFile->pHeader = reinterpret_cast<trace_file_header*>(pBytes);
-    pTraceFile->pMapEnd = ring_position(pTraceFile, pTraceFile->uSize);
-    pTraceFile->pWrap = ring_position(pTraceFile, pTraceFile->pHeader->uOffset);
-}
-
 /// The checks and the summary of the opening. Returns whether it would succeed.
 bool open_file(trace_file* pTraceFile, const trace_file_header& header) {
     pTraceFile->timeInfo = header.timeInfo;
@@ -151,14 +141,14 @@ void take_record(reading& run, const trace_record_header& header) {
 /// Where a walk stands.
 struct walk_state {
     trace_record_header* pCurRec;
+    uint32_t uExpectedSeq;
     uint32_t uSeqLock;
-    uint64_t uUncountedBytes;
 
     friend bool operator==(const walk_state&, const walk_state&) = default;
 };
 
 walk_state state_of(const trace_file* pTraceFile) {
-    return {pTraceFile->pCurRec, load_seq_lock(pTraceFile->pHeader), pTraceFile->uUncountedBytes};
+    return {pTraceFile->pCurRec, pTraceFile->uExpectedSeq, pTraceFile->pHeader->uSeqLock};
 }
 
 /// The step as the reader makes it, held against that by the plain operations.
@@ -171,8 +161,7 @@ walk_result step(trace_file* pTraceFile, trace_record_header* pHeader) {
     const walk_state behind = state_of(pTraceFile);
 
     pTraceFile->pCurRec = before.pCurRec;
-    store_seq_lock(pTraceFile->pHeader, before.uSeqLock);
-    pTraceFile->uUncountedBytes = before.uUncountedBytes;
+    pTraceFile->uExpectedSeq = before.uExpectedSeq;
     const walk_result result = step_and_judge(pTraceFile, pHeader);
     hostile_check(result == plain && state_of(pTraceFile) == behind,
                   "both ways of stepping lead to the same place");
@@ -187,8 +176,8 @@ bool is_taken(const reading& run, const trace_record_header& header) {
 
 hostile_end walk(reading& run) {
     trace_file* const pTraceFile = run.pTraceFile;
-    // What is left of the first turn, and one more when the oldest position
-    // holds a filler whose number happens to be the next one.
+    // What is left of the first turn, and one more when the number at the oldest
+    // position happens to be the next one.
     uint64_t uStepsLeft = 2 * (ring_size(pTraceFile) / sizeof(trace_record_header)) + 2;
     trace_record_header header;
     walk_result here = is_last_record(pTraceFile, &header);
@@ -278,7 +267,9 @@ hostile_result read_hostile_file(trace_bytes bytes, const hostile_options& optio
         return result;
     const byte_block pBytes = copy_of(bytes);
     trace_file file{};
-    map_over(&file, pBytes.get(), bytes);
+    file.pName = fileName;
+    file.fd = -1;
+    ring_map_over(&file, pBytes.get(), bytes.size());
     const auto header = load<trace_file_header>(bytes, 0);
     file.addrMode64 = (header.uProperties & TRC_PROP_ADDR_64) != 0;
     result.bAccepted = open_file(&file, header);

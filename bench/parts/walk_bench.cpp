@@ -4,6 +4,7 @@
 #include "first_record.h"
 #include "merge_file.h"
 #include "record_batch.h"
+#include "ring.h"
 #include "walk.h"
 
 #include <benchmark/benchmark.h>
@@ -30,10 +31,7 @@ struct memory_ring {
             std::memcpy(&bytes[sizeof header + i * sizeof record], &record, sizeof record);
         }
         file.pName = name;
-        file.pHeader = reinterpret_cast<trace_file_header*>(bytes.data());
-        file.pWrap = reinterpret_cast<trace_record_header*>(bytes.data() + sizeof header);
-        file.pMapEnd = reinterpret_cast<trace_record_header*>(bytes.data() + bytes.size());
-        file.uSize = static_cast<uint32_t>(bytes.size());
+        ring_map_over(&file, bytes.data(), bytes.size());
     }
 
     std::vector<std::byte> bytes;

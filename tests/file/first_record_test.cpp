@@ -39,6 +39,21 @@ TEST(FirstRecord, lies_behind_fillers_and_unfinished_records_and_round_the_end) 
     EXPECT_EQ(atOnce.file.timeStampIsValid, 0) << "only a step takes a time";
 }
 
+TEST(FirstRecord, is_not_the_newest_which_waits_for_its_number) {
+    raw_trace raw(400);
+    raw.header.timeInfo = {.timeinfo1 = 100, .timeinfo2 = 0};
+    raw.put(260, {.seqNumber = TRC_SEQ_FILLER, .timeStamp = 9, .length = 40});
+    raw.put(300, {.function = 0, .seqNumber = TRC_SEQ_FILLER, .length = 100});
+    raw.put(200, {.seqNumber = 6, .timeStamp = 7, .length = 60});
+    raw.header.uOldestRecordOffset = 260;
+    memory_trace trace(raw);
+    EXPECT_EQ(find(trace), (search_result{0, 200, 6, ""}));
+    cu_nanoseconds time = 0;
+    EXPECT_TRUE(oldest_record_time(&trace.file, &time) && time == 107);
+    trace.put(200, {.function = 0, .seqNumber = TRC_SEQ_FILLER, .length = 60});
+    EXPECT_EQ(find(trace), (search_result{0, 260, TRC_SEQ_FILLER, ""})) << "it is the only one";
+}
+
 TEST(FirstRecord, search_gives_up_where_the_ring_is_damaged) {
     for (const int iLength : {0, 27}) {
         raw_trace raw(400);

@@ -14,11 +14,9 @@ public:
     explicit memory_trace(const raw_trace& trace) : content(trace.bytes()) {
         content.shrink_to_fit();
         file.pName = name.data();
-        file.uSize = static_cast<uint32_t>(content.size());
-        file.pHeader = reinterpret_cast<trace_file_header*>(content.data());
-        file.pMapEnd = ring_position(&file, file.uSize);
-        file.pWrap = ring_position(&file, trace.header.uOffset);
+        ring_map_over(&file, content.data(), content.size());
         file.pCurRec = file.pWrap;
+        file.uExpectedSeq = trace.header.uSeqLock;
         file.timeInfo = trace.header.timeInfo;
         file.uPlatform = trace.header.uPlatform;
     }

@@ -104,8 +104,10 @@ TEST(Walk, knows_that_it_has_caught_up_and_says_when_the_ring_is_inconsistent) {
     raw.add_rest();
     memory_trace trace(raw);
     trace_file_header& header = *trace.file.pHeader;
+    header.uSeqLock = TRC_SEQ_NO_READER; // somebody else's store
     EXPECT_EQ(ask(trace, 200), A_RECORD) << "the next one in sequence";
-    header.uSeqLock = 8;
+    EXPECT_EQ(header.uSeqLock, 10U) << "put right by the look";
+    trace.file.uExpectedSeq = 8;
     EXPECT_EQ(ask(trace, 200), NO_RECORD) << "another one";
     EXPECT_EQ(ask(trace, 232), A_RECORD) << "not on the oldest position";
 
@@ -121,14 +123,17 @@ TEST(Walk, knows_that_it_has_caught_up_and_says_when_the_ring_is_inconsistent) {
     EXPECT_EQ(trace.offset(), 232U) << "no step";
     header.uOldestRecordOffset = 264;
     EXPECT_EQ(ask(trace, 232), A_RECORD);
+    header.uSeqLock = 0;
+    EXPECT_EQ(step(trace), A_RECORD);
+    EXPECT_EQ(header.uSeqLock, 10U) << "put right by the step";
 }
 
 TEST(Walk, does_not_pass_a_record_that_ends_beyond_the_file) {
     raw_trace raw(400);
     raw.header.uOldestRecordOffset = 340;
+    raw.header.uSeqLock = 2;
     memory_trace trace(raw);
     for (const int64_t iLength : {61LL, 0xFFFFFF00LL, 0xFFFFFFFFLL}) {
-        trace.file.pHeader->uSeqLock = 2;
         trace.put(340, {.seqNumber = 2, .length = iLength});
         const uint64_t uNext = 340 + static_cast<uint64_t>(iLength);
         EXPECT_EQ(step(trace.stand_on(340)), out_of_bounds(trace, uNext));
@@ -156,28 +161,33 @@ TEST(Walk, waits_for_a_number_only_on_the_newest_record) {
     EXPECT_TRUE(number_has_come(&trace.file, &header));
 }
 
-TEST(Walk, ends_on_a_ring_of_fillers_and_notices_a_writer_that_goes_on) {
-    raw_trace raw(400);
-    raw.add_filler(100);
-    raw.add_filler(100);
-    for (const bool bMovesOldest : {false, true}) {
+TEST(Walk, takes_no_gap_filler_for_the_next_record) {
+    for (const bool bFillersOnly : {false, true}) {
+        raw_trace raw(400);
+        raw.add_filler(100);
+        if (bFillersOnly)
+            raw.add_filler(64);
+        else
+            for (const uint32_t uNumber : {0xFFDU - 2, 0xFFDU})
+                raw.add({.seqNumber = uNumber, .body = raw_bytes(7U)});
+        raw.add_rest();
         memory_trace trace(raw);
         ASSERT_EQ(find_first_record(&trace.file), 0);
         int iSteps = 0;
         while (iSteps < 10 && get_next_record(&trace.file) == WALK_RECORD)
             ++iSteps;
-        EXPECT_EQ(iSteps, 2) << "one turn";
+        EXPECT_EQ(iSteps, bFillersOnly ? 0 : 3) << "once";
+        EXPECT_EQ(trace.file.uExpectedSeq, 0xFFFU);
         EXPECT_EQ(ask(trace, 200), NO_RECORD) << "still the same";
-        if (bMovesOldest) { // the record goes behind what stands here
-            trace.put(300, {.seqNumber = TRC_SEQ_FILLER, .length = 100});
-            trace.file.pHeader->uOldestRecordOffset = 300;
-            EXPECT_EQ(step(trace), A_RECORD);
-        } else {
-            trace.put(200, {.seqNumber = TRC_SEQ_FILLER, .length = 100});
-        }
-        EXPECT_EQ(step(trace), A_RECORD);
-        EXPECT_EQ(trace.file.pHeader->uSeqLock, TRC_SEQ_FILLER + 2);
-        EXPECT_EQ(trace.file.uUncountedBytes, 0U);
+
+        // A writer goes on.
+        const uint32_t uNumber = bFillersOnly ? 70 : 0xFFF;
+        trace.put(200, {.seqNumber = uNumber, .length = 50});
+        trace.put(250, {.function = 0, .seqNumber = TRC_SEQ_FILLER, .length = 50});
+        trace.file.pHeader->uOldestRecordOffset = 250;
+        EXPECT_EQ(step(trace.stand_on(200)), A_RECORD);
+        EXPECT_EQ(trace.file.pHeader->uSeqLock, uNumber + 2) << "known from the first record on";
+        EXPECT_EQ(ask(trace, 250), NO_RECORD);
     }
 }
 

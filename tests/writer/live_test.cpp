@@ -27,9 +27,7 @@ constexpr uint32_t HEADER = sizeof(trace_file_header);
 struct live_reader {
     explicit live_reader(std::span<std::byte> mapped) {
         file.pName = name;
-        file.pHeader = reinterpret_cast<trace_file_header*>(mapped.data());
-        file.pMapEnd = ring_position(&file, mapped.size());
-        file.pWrap = ring_position(&file, file.pHeader->uOffset);
+        ring_map_over(&file, mapped.data(), mapped.size());
     }
 
     /// The number in the record that stands in `header`.

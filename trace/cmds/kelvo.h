@@ -119,6 +119,15 @@ struct thread_info {
 };
 
 struct trace_queue_element;
+struct trace_twins;
+
+/// Which file this is, whatever path names it: see is_same_file.
+struct file_identity {
+    uint64_t uDevice;
+    uint64_t uInode;
+    int64_t iBornSeconds; ///< 0 where the file system does not know
+    uint32_t uBornNanoSeconds;
+};
 
 /// One trace file of the run. Made in one block with its path, all zero but fd.
 ///
@@ -127,18 +136,21 @@ struct trace_queue_element;
 /// - the main thread: timeInfo, pThreadInfo and modTime from the first queued record
 ///   on until the reader closes the file, which it does only when none of its records
 ///   is queued or being formatted;
-/// - under priorityQmutex: numRecPushed.
+/// - under priorityQmutex: numRecPushed;
+/// - under the mutex of its twins, while they run: its links and its place among them.
 ///
 /// What the reader writes at every record, what the main thread writes at every
 /// record, and what both only read lie in cache lines apart.
 struct trace_file {
     trace_file* pNext;            ///< next file of anchor.pFirstFile
     char* pName;                  ///< path as given; lies in the same block
-    trace_file_header* pHeader;   ///< start of the mapping, or the private copy while parked
+    trace_file_header* pHeader;   ///< start of the mapping; null when not mapped
     trace_record_header* pMapEnd; ///< end of the mapping; null when not mapped
     trace_record_header* pWrap;   ///< start of the record area; null when not mapped
     alignas(CACHE_LINE) trace_record_header* pCurRec; ///< where the reader stands
-    uint64_t uUncountedBytes;   ///< bytes walked since a record last counted in the sequence
+    uint32_t uExpectedSeq;      ///< number of the next record in sequence, uSeqLock for the writer
+    uint32_t uStepsToTell;      ///< with bTellsSeldom: steps until uSeqLock is stored again
+    bool bTellsSeldom;          ///< uSeqLock is not stored at every step, or never
     alignas(CACHE_LINE) int fd; ///< -1 when closed
     uint32_t uSize;             ///< bytes mapped
     int index;                  ///< position among the file arguments, from 0
@@ -149,25 +161,29 @@ struct trace_file {
     int32_t startSeconds;
     int32_t startNanoSeconds;
     int32_t startRecords;
-    std::atomic<int> bDone; ///< reading is over; set last by the reader
-    trace_queue_element* pFirstElement;
-    trace_queue_element* pLastElement;
-    uint32_t queueSize;
-    int bOverflow; ///< while set, records are not queued
-    pthread_mutex_t queueMutex;
+    std::atomic<int> bDone;               ///< reading is over; set last by the reader
     std::atomic<pthread_t> threadId;      ///< pool thread that runs the reader; 0: none
     alignas(CACHE_LINE) timespec modTime; ///< latest record time seen
     int timeStampIsValid;                 ///< modTime holds a time
     thread_info* pThreadInfo;
-    alignas(CACHE_LINE) uint32_t queueDepth;
-    uint32_t numRecPushed;             ///< records in the output queue or being formatted
-    uint32_t index2;                   ///< position in the sorted pre-processing list
-    std::atomic<int> bErrorProcessing; ///< reading could not be started
+    alignas(CACHE_LINE) uint32_t numRecPushed; ///< records in the output queue or being formatted
+    uint32_t index2;                           ///< position in the sorted pre-processing list
+    std::atomic<int> bErrorProcessing;         ///< reading could not be started
 
     // Not part of the format of the record, but kept beside it:
     alignas(CACHE_LINE) uint8_t uPlatform; ///< the writer's platform code, taken at open
-    int bAccepted;      ///< the header was validated: the two reader words may be stored
-    size_t uMappedSize; ///< bytes mapped at pHeader; uSize is its low 32 bits
+    int bAccepted;            ///< the header was validated: the two reader words may be stored
+    size_t uMappedSize;       ///< bytes mapped at pHeader; uSize is its low 32 bits
+    bool bReadOnly;           ///< opened for reading, without a lock; nothing is stored in the file
+    file_identity identity;   ///< of what was opened first
+    trace_file* pNextInTable; ///< of the table of accepted files
+    trace_twins* pTwins;      ///< null: no other argument names the same file
+    trace_file* pNextTwin;    ///< next running twin
+    trace_file* pPrevTwin;
+    uint32_t uToldSeq; ///< the number it waits for, as the twins know it
+    bool bAmongTwins;  ///< it runs and shares what is open
+    bool bTold;        ///< uToldSeq holds a number
+    bool bAsks;        ///< it wants uTailReq raised
 };
 
 /// trace_file::startOptions.

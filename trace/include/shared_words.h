@@ -70,11 +70,6 @@ inline bool tail_request_is_acknowledged(const trace_file_header* pHeader) {
     return (__atomic_load_n(&pHeader->uFlags, __ATOMIC_ACQUIRE) & TRC_FLAG_TAIL_ACK) != 0;
 }
 
-/// The reader's own word: no order is needed to read it back.
-inline uint32_t load_seq_lock(const trace_file_header* pHeader) {
-    return __atomic_load_n(&pHeader->uSeqLock, __ATOMIC_RELAXED);
-}
-
 inline void store_seq_lock(trace_file_header* pHeader, uint32_t uSeqLock) {
     __atomic_store_n(&pHeader->uSeqLock, uSeqLock, __ATOMIC_RELEASE);
 }
@@ -147,16 +142,18 @@ inline void copy_header_words(trace_record_header* pHeader, const std::byte* pRe
     memcpy(pHeader, words.data(), sizeof *pHeader);
 }
 
-/// A copy of the record header at `pRecord`. Its seqNumber is read before the
-/// rest: if that is the expected one, the others are complete. What is returned
-/// does not change any more, whatever the writer does.
-inline trace_record_header load_record_header(const void* pRecord) {
+/// Copies the record header at `pRecord`. Its seqNumber is read before the rest: if
+/// that is the expected one, the others are complete. What is copied does not change
+/// any more, whatever the writer does.
+inline void load_record_header(const void* pRecord, trace_record_header* pHeader) {
     const auto* const pBytes = static_cast<const std::byte*>(pRecord);
     const uint32_t seqNumber = load_first(pBytes + offsetof(trace_record_header, seqNumber));
-    trace_record_header header;
-    copy_header_words(&header, pBytes);
+    copy_header_words(pHeader, pBytes);
     std::atomic_signal_fence(std::memory_order_seq_cst); // no field is read from the ring again
-    if (header.seqNumber != seqNumber) [[unlikely]]      // stored meanwhile; not always, since a
-        header.seqNumber = seqNumber;                    // store would hold up the next copy
-    return header;
+    if (pHeader->seqNumber == seqNumber) [[likely]]
+        return;
+    // Stored meanwhile. The fence keeps the compiler from storing it always, which
+    // would hold up whoever reads the copy at once.
+    std::atomic_signal_fence(std::memory_order_seq_cst);
+    pHeader->seqNumber = seqNumber;
 }

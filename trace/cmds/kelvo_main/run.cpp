@@ -1,6 +1,7 @@
 #include "run.h"
 
 #include "cleanup.h"
+#include "descriptors.h"
 #include "file_starts.h"
 #include "handover.h"
 #include "insufficient.h"
@@ -8,7 +9,7 @@
 #include "merge.h"
 #include "messages.h"
 #include "mutex.h"
-#include "open.h"
+#include "opening.h"
 #include "pool.h"
 #include "print.h"
 #include "progress.h"
@@ -197,6 +198,7 @@ int end_run(int bError) {
 
 int run(const command_line& command) {
     trc_init_recursive_mutex(&ctrl.priorityQmutex);
+    raise_descriptor_limit();
     anchor.threadId = pthread_self();
 
     // The jump point is set while signals are blocked, so that the mask saved

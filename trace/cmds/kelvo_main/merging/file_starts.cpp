@@ -113,7 +113,7 @@ int start_tracefile_processing(trace_file* pTraceFile, const TrcPreProcHdrElem* 
         file_stops_running(file);
         warn_insufficient_resources_during_open(pTraceFile->pName, pTraceFile->uSize);
     }
-    close_trace_file(pTraceFile, 0);
+    close_trace_file(pTraceFile);
     return -1;
 }
 

@@ -6,6 +6,7 @@
 #include "messages.h"
 #include "mutex.h"
 #include "open.h"
+#include "reader_words.h"
 #include "start.h"
 #include "walk.h"
 
@@ -136,8 +137,10 @@ task_wish reader_step::read() {
             break;
         if (m_records.count() >= m_uRoom) {
             m_uRoom = push_and_ask(m_file, m_records.take_over());
-            if (m_uRoom == 0)
+            if (m_uRoom == 0) {
+                tell_place_now(m_pTraceFile);
                 return SUSPEND;
+            }
         }
         if (++uRead == MOST_IN_A_STEP)
             return pause_until(0);
@@ -151,6 +154,7 @@ task_wish reader_step::read() {
 /// Leaves the thread until the moment, with nothing kept back.
 task_wish reader_step::pause_until(int64_t iMoment) {
     push_batches(m_file, m_records.take_over());
+    tell_place_now(m_pTraceFile);
     return {task_wish::LATER, iMoment};
 }
 
@@ -173,7 +177,7 @@ task_wish reader_step::close() {
         const mutex_guard guard(ctrl.priorityQmutex);
         file_was_read();
     }
-    close_trace_file(m_pTraceFile, 0);
+    close_trace_file(m_pTraceFile);
     say("Closed", m_pTraceFile);
     const mutex_guard guard(ctrl.priorityQmutex);
     file_stops_running(m_file);

@@ -9,14 +9,18 @@
 #include "kelvo.h"
 
 /// `pRec` is printed, never followed.
-void warn_out_of_bounds(const trace_file* pTraceFile, const trace_record_header* pRec);
+[[gnu::cold]] void warn_out_of_bounds(const trace_file* pTraceFile,
+                                      const trace_record_header* pRec);
 
-void warn_record_function(const trace_file* pTraceFile, uint32_t uOffset, uint16_t uFunction);
-void warn_record_component(const trace_file* pTraceFile, uint32_t uOffset, const char* pCompId);
-void warn_record_length(const trace_file* pTraceFile, uint32_t uOffset, uint32_t uLength);
+[[gnu::cold]] void warn_record_function(const trace_file* pTraceFile, uint32_t uOffset,
+                                        uint16_t uFunction);
+[[gnu::cold]] void warn_record_component(const trace_file* pTraceFile, uint32_t uOffset,
+                                         const char* pCompId);
+[[gnu::cold]] void warn_record_length(const trace_file* pTraceFile, uint32_t uOffset,
+                                      uint32_t uLength);
 
 /// The reader stands beyond uActualFileSize.
-void warn_beyond_file_size(uint32_t uOffset);
+[[gnu::cold]] void warn_beyond_file_size(uint32_t uOffset);
 
 /// The record at `uOffset` runs over the position where the oldest data begins.
-void warn_runs_over_oldest(uint32_t uOffset, const trace_record_header& header);
+[[gnu::cold]] void warn_runs_over_oldest(uint32_t uOffset, const trace_record_header& header);

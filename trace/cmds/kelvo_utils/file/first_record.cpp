@@ -1,6 +1,7 @@
 #include "first_record.h"
 
 #include "corruption.h"
+#include "reader_words.h"
 #include "ring.h"
 #include "shared_words.h"
 #include "walk.h"
@@ -23,8 +24,10 @@ struct ring_search {
         return read_record_header(ring_position(pTraceFile, uOffset));
     }
 
-    bool stands_on_oldest() const {
-        return uOffset == load_oldest_record_offset(pTraceFile->pHeader);
+    /// Back where the search began. The oldest position may be elsewhere by now: a
+    /// writer that made it begin on an unfinished record has finished that one.
+    bool is_back() const {
+        return uWalked == ring_size(pTraceFile);
     }
 
     bool has_gone_round() const {
@@ -39,8 +42,16 @@ struct ring_search {
     }
 };
 
-bool is_passed_over(uint16_t uFunction) {
-    return uFunction == TRC_FUNC_FILLER || uFunction == TRC_FUNC_WRITING;
+/// Fillers and what is just being written: held records, and the newest record
+/// while it stands on the oldest position and waits for its number.
+bool is_passed_over(const trace_record_header& header) {
+    return header.function == TRC_FUNC_FILLER || header.function == TRC_FUNC_WRITING ||
+           header.seqNumber == TRC_SEQ_FILLER;
+}
+
+void stand_on(trace_file* pTraceFile, const trace_record_header& header) {
+    pTraceFile->uExpectedSeq = header.seqNumber;
+    tell_place_now(pTraceFile);
 }
 
 int give_up_at(const ring_search& search) {
@@ -63,28 +74,26 @@ cu_timeinfo time_base(const trace_file* pTraceFile, uint64_t uOffset,
 } // namespace
 
 void request_tail(trace_file* pTraceFile) {
-    store_tail_request(pTraceFile->pHeader, TRC_TAIL_REQUESTED);
+    raise_tail_request(pTraceFile);
 }
 
 bool tail_is_kept(const trace_file* pTraceFile) {
-    return tail_request_is_acknowledged(pTraceFile->pHeader);
+    return pTraceFile->bReadOnly || tail_request_is_acknowledged(pTraceFile->pHeader);
 }
 
 void release_tail(trace_file* pTraceFile) {
-    store_tail_request(pTraceFile->pHeader, 0);
+    lower_tail_request(pTraceFile);
 }
 
 int find_first_record(trace_file* pTraceFile) {
-    trace_file_header* const pHeader = pTraceFile->pHeader;
-    ring_search search{pTraceFile, load_oldest_record_offset(pHeader)};
+    ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
     pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);
-    pTraceFile->uUncountedBytes = 0;
     if (!search.stands_on_record())
         return give_up_at(search);
     trace_record_header header = search.header();
-    store_seq_lock(pHeader, header.seqNumber);
+    stand_on(pTraceFile, header);
 
-    while (is_passed_over(header.function)) {
+    while (is_passed_over(header)) {
         if (header.length < sizeof(trace_record_header)) {
             warn_record_length(pTraceFile, static_cast<uint32_t>(search.uOffset), header.length);
             return -1;
@@ -93,12 +102,12 @@ int find_first_record(trace_file* pTraceFile) {
         pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);
         if (!search.stands_on_record())
             return give_up_at(search);
-        if (search.stands_on_oldest())
+        if (search.is_back())
             return 0;
         if (search.has_gone_round())
             return give_up_at(search);
         header = search.header();
-        store_seq_lock(pHeader, header.seqNumber);
+        stand_on(pTraceFile, header);
         cu_cvt_time_platform_1(header.timeStamp, &pTraceFile->timeInfo, &pTraceFile->modTime,
                                pTraceFile->uPlatform);
         pTraceFile->timeStampIsValid = 1;
@@ -110,12 +119,12 @@ bool oldest_record_time(const trace_file* pTraceFile, cu_nanoseconds* pTime) {
     ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
     while (search.stands_on_record() && !search.has_gone_round()) {
         const trace_record_header header = search.header();
-        if (trc_kind_is_output(header.function)) {
+        const bool bPassedOver = is_passed_over(header);
+        if (!bPassedOver && trc_kind_is_output(header.function)) {
             *pTime = cu_time_ns(header.timeStamp, time_base(pTraceFile, search.uOffset, header));
             return true;
         }
-        const bool bPassable =
-            is_passed_over(header.function) || trc_kind_is_valid(header.function);
+        const bool bPassable = bPassedOver || trc_kind_is_valid(header.function);
         if (!bPassable || header.length < sizeof(trace_record_header))
             return false;
         search.step(header.length);

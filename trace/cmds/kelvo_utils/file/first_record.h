@@ -18,9 +18,9 @@ bool tail_is_kept(const trace_file* pTraceFile);
 void release_tail(trace_file* pTraceFile);
 
 /// Places pCurRec on the oldest record, past fillers and unfinished records,
-/// keeping uSeqLock, modTime and timeStampIsValid. Works over plain memory and
-/// goes once around the ring at most. When there is nothing but fillers and
-/// unfinished records, pCurRec is back on the oldest position.
+/// keeping uExpectedSeq, uSeqLock, modTime and timeStampIsValid. Works over plain
+/// memory and goes once around the ring at most. When there is nothing but fillers
+/// and unfinished records, pCurRec is back on the oldest position.
 /// Returns 0, or -1 when the file is corrupt (the warning is written).
 int find_first_record(trace_file* pTraceFile);
 

@@ -1,117 +1,131 @@
-#include "insufficient.h"
+#include "descriptors.h"
+#include "identity.h"
 #include "mapping.h"
-#include "messages.h"
-#include "open.h"
-#include "print.h"
 #include "ring.h"
 
 #include <cerrno>
-#include <cstdlib>
 #include <fcntl.h>
 #include <sys/mman.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
 
-/// A trace file on the number of a standard stream that came closed would be
-/// printed into. Returns a number above them for the same file, or -1 with errno.
-int above_standard_descriptors(int fd) {
-    if (fd < 0 || fd > STDERR_FILENO)
-        return fd;
-    const int higher = fcntl(fd, F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
-    const int savedErrno = errno;
-    close(fd);
-    errno = savedErrno;
-    return higher;
+/// The status of an open file, or why there is none.
+struct taken_status {
+    file_status status;
+    int iErrno; ///< 0: taken
+};
+
+/// Whether the file may be opened under this record. An accepted one has been seen
+/// before. In follow mode the others of the run are open, and to close a second
+/// descriptor of one of them would drop its lock.
+open_outcome judge_identity(const trace_file* pTraceFile, const file_identity& identity) {
+    if (pTraceFile->bAccepted)
+        return is_same_file(identity, pTraceFile->identity) ? OPEN_OK : OPEN_REPLACED;
+    return anchor.bFollow && find_accepted_file(identity) != nullptr ? OPEN_IN_USE : OPEN_OK;
 }
 
-/// O_NONBLOCK and O_NOCTTY mean nothing to a regular file; they keep the open
-/// of a terminal line or another device from waiting or taking it over.
-int open_file(trace_file* pTraceFile) {
-    pTraceFile->fd = above_standard_descriptors(
-        open(pTraceFile->pName, O_RDWR | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-    if (pTraceFile->fd >= 0)
-        return 0;
-    output_sys_message("%s: 2625-102 Error opening file \"%s\",", errno, anchor.pProgName,
-                       pTraceFile->pName);
-    return -1;
+/// Opens the file that is meant.
+open_result open_file(trace_file* pTraceFile, taken_status* pTaken) {
+    file_status* const pStatus = &pTaken->status;
+    if ((anchor.bFollow || pTraceFile->bAccepted) && status_of_path(pTraceFile->pName, pStatus))
+        if (const open_outcome eOutcome = judge_identity(pTraceFile, pStatus->identity))
+            return {eOutcome};
+    const int fd = open_descriptor(pTraceFile->pName, pTraceFile->bReadOnly ? O_RDONLY : O_RDWR);
+    if (fd < 0)
+        return {OPEN_REFUSED, errno};
+    pTaken->iErrno = status_of_descriptor(fd, pStatus) ? 0 : errno;
+    if (pTaken->iErrno == 0)
+        if (const open_outcome eOutcome = judge_identity(pTraceFile, pStatus->identity))
+            // Exchanged since it was looked at. It may be one that is being read under
+            // another name, so the descriptor stays open to the end of the run.
+            return {eOutcome};
+    pTraceFile->fd = fd;
+    return {};
 }
 
-int lock_file(const trace_file* pTraceFile) {
+open_result lock_file(const trace_file* pTraceFile) {
     struct flock whole_file {};
     whole_file.l_type = F_WRLCK;
     whole_file.l_whence = SEEK_SET;
     if (fcntl(pTraceFile->fd, F_SETLK, &whole_file) == 0)
-        return 0;
-    if (errno == EACCES || errno == EAGAIN)
-        output_message("%s: 2625-161 Trace file \"%s\" is already in use.\n", anchor.pProgName,
-                       pTraceFile->pName);
-    else
-        output_sys_message(
-            "%s: 2625-162 Error returned from fcntl() attempting to lock trace file, ", errno,
-            anchor.pProgName);
-    return -1;
+        return {};
+    const bool bHeld = errno == EACCES || errno == EAGAIN;
+    return {bHeld ? OPEN_IN_USE : OPEN_LOCK_FAILED, errno};
 }
 
-/// What is no regular file has no size and cannot be mapped: too small as well.
-int get_size(const trace_file* pTraceFile, size_t* pSize) {
-    struct stat status {};
-    if (fstat(pTraceFile->fd, &status) != 0) {
-        output_sys_message("%s: 2625-104 Error retrieving information about file \"%s\", ", errno,
-                           anchor.pProgName, pTraceFile->pName);
-        return -1;
-    }
-    *pSize = S_ISREG(status.st_mode) ? static_cast<size_t>(status.st_size) : 0;
-    if (*pSize >= sizeof(trace_file_header))
-        return 0;
-    output_err_message("%s: 2625-105 File \"%s\" is too small to be a trace file.\n",
-                       anchor.pProgName, pTraceFile->pName);
-    return -1;
-}
-
-/// Maps all `uMappedSize` bytes, though no position beyond the low 32 bits of
-/// the size is ever used: the header of a larger file lies inside in any case.
-int map_file(trace_file* pTraceFile, size_t uMappedSize) {
-    pTraceFile->uSize = static_cast<uint32_t>(uMappedSize);
+/// Maps all bytes of the file, though no position beyond the low 32 bits of its size
+/// is ever used: the header of a larger file lies inside in any case. Nothing reaches
+/// a file that is only read: what is stored lands in private pages.
+open_result map_file(trace_file* pTraceFile, uint64_t uFileSize) {
+    const int iSharing = pTraceFile->bReadOnly ? MAP_PRIVATE | MAP_NORESERVE : MAP_SHARED;
+    pTraceFile->uSize = static_cast<uint32_t>(uFileSize);
     void* const pMapping =
-        mmap(nullptr, uMappedSize, PROT_READ | PROT_WRITE, MAP_SHARED, pTraceFile->fd, 0);
-    if (pMapping == MAP_FAILED) {
-        if (errno == EACCES)
-            output_message("%s: 2625-180 Either file permissions are too restrictive, or the "
-                           "trace file must be copied outside of NFS to be used.\n ",
-                           anchor.pProgName);
-        else
-            warn_insufficient_resources_during_open(pTraceFile->pName, pTraceFile->uSize);
-        return -1;
-    }
-    pTraceFile->uMappedSize = uMappedSize;
-    pTraceFile->pHeader = static_cast<trace_file_header*>(pMapping);
-    pTraceFile->pMapEnd = ring_position(pTraceFile, pTraceFile->uSize);
-    pTraceFile->pWrap = ring_position(pTraceFile, pTraceFile->pHeader->uOffset);
-    return 0;
+        mmap(nullptr, uFileSize, PROT_READ | PROT_WRITE, iSharing, pTraceFile->fd, 0);
+    if (pMapping == MAP_FAILED && errno == EACCES)
+        return {OPEN_NOT_MAPPABLE, errno};
+    if (pMapping == MAP_FAILED)
+        return {OPEN_NO_MEMORY, errno, pTraceFile->uSize};
+    pTraceFile->uMappedSize = uFileSize;
+    ring_map_over(pTraceFile, pMapping, uFileSize);
+    return {};
 }
 
-} // namespace
-
-int open_lock_map_trace_file(trace_file* pTraceFile) {
-    free(pTraceFile->pHeader);
-    pTraceFile->pHeader = nullptr;
-
-    size_t uMappedSize = 0;
-    if (open_file(pTraceFile) != 0)
-        return -1;
-    if (!anchor.bNoFileLocking && lock_file(pTraceFile) != 0)
-        return -1;
-    if (get_size(pTraceFile, &uMappedSize) != 0)
-        return -1;
-    return map_file(pTraceFile, uMappedSize);
+open_result lock_and_map(trace_file* pTraceFile, const taken_status& taken) {
+    if (!anchor.bNoFileLocking && !pTraceFile->bReadOnly)
+        if (const open_result result = lock_file(pTraceFile); result.eOutcome != OPEN_OK)
+            return result;
+    if (taken.iErrno != 0)
+        return {OPEN_NO_STATUS, taken.iErrno};
+    // What is no regular file has no size and cannot be mapped: too small as well.
+    if (!taken.status.bRegular || taken.status.uSize < sizeof(trace_file_header))
+        return {OPEN_TOO_SMALL};
+    pTraceFile->identity = taken.status.identity;
+    return map_file(pTraceFile, taken.status.uSize);
 }
 
-void unmap_trace_file(trace_file* pTraceFile) {
-    munmap(pTraceFile->pHeader, pTraceFile->uMappedSize);
+void forget_mapping(trace_file* pTraceFile) {
     pTraceFile->uMappedSize = 0;
     pTraceFile->pHeader = nullptr;
     pTraceFile->pMapEnd = nullptr;
     pTraceFile->pWrap = nullptr;
+}
+
+} // namespace
+
+open_result open_alone(trace_file* pTraceFile) {
+    pTraceFile->fd = -1;
+    taken_status taken{};
+    open_result result = open_file(pTraceFile, &taken);
+    if (result.eOutcome == OPEN_OK)
+        result = lock_and_map(pTraceFile, taken);
+    if (result.eOutcome != OPEN_OK)
+        close_descriptor(pTraceFile);
+    return result;
+}
+
+void unmap_trace_file(trace_file* pTraceFile) {
+    if (pTraceFile->pMapEnd != nullptr)
+        munmap(pTraceFile->pHeader, pTraceFile->uMappedSize);
+    forget_mapping(pTraceFile);
+}
+
+void close_descriptor(trace_file* pTraceFile) {
+    if (pTraceFile->fd >= 0)
+        close(pTraceFile->fd);
+    pTraceFile->fd = -1;
+}
+
+void share_open_file(trace_file* pTraceFile, const trace_file* pOther) {
+    pTraceFile->fd = pOther->fd;
+    pTraceFile->uSize = pOther->uSize;
+    pTraceFile->uMappedSize = pOther->uMappedSize;
+    pTraceFile->pHeader = pOther->pHeader;
+    pTraceFile->pMapEnd = pOther->pMapEnd;
+    pTraceFile->pWrap = pOther->pWrap;
+}
+
+void forget_open_file(trace_file* pTraceFile) {
+    pTraceFile->fd = -1;
+    forget_mapping(pTraceFile);
 }

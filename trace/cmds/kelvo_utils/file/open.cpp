@@ -1,138 +1,79 @@
 #include "open.h"
 
 #include "accept.h"
-#include "insufficient.h"
 #include "mapping.h"
-#include "messages.h"
-#include "mutex.h"
-#include "print.h"
-#include "start.h"
-#include "summary.h"
-#include "usage.h"
+#include "twins.h"
 
+#include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <new>
-#include <unistd.h>
 
 namespace {
 
-constexpr uint16_t VERSION_WITH_BASE_PROG_NAME = 5;
-
-/// A file that is not handed out is closed and released.
-struct file_closer {
-    void operator()(trace_file* pTraceFile) const {
-        close_trace_file(pTraceFile, 0);
-        release_trace_file(pTraceFile);
-    }
-};
-using trace_file_ptr = std::unique_ptr<trace_file, file_closer>;
-
-struct block_freer {
-    void operator()(void* pBlock) const {
-        free(pBlock);
-    }
-};
-using header_copy_ptr = std::unique_ptr<trace_file_header, block_freer>;
-
-/// The record and, behind it in the same block, its path. Null when memory ran
-/// out (reported).
-trace_file_ptr make_trace_file(const char* pName) {
+/// The record and, behind it in the same block, its path.
+open_result make_trace_file(const char* pName, trace_file_ptr* ppTraceFile) {
     const size_t uNameSize = strlen(pName) + 1;
     constexpr size_t ALIGNMENT = alignof(trace_file);
     const size_t uSize = (sizeof(trace_file) + uNameSize + ALIGNMENT - 1) / ALIGNMENT * ALIGNMENT;
     void* const pBlock = aligned_alloc(ALIGNMENT, uSize);
-    if (pBlock == nullptr) {
-        warn_insufficient_resources_during_open(pName, static_cast<int64_t>(uSize));
-        return nullptr;
-    }
-    trace_file_ptr pTraceFile(new (pBlock) trace_file{});
+    if (pBlock == nullptr)
+        return {OPEN_NO_MEMORY, ENOMEM, static_cast<int64_t>(uSize)};
+    auto* const pTraceFile = new (pBlock) trace_file{};
     pTraceFile->pName = static_cast<char*>(pBlock) + sizeof(trace_file);
     memcpy(pTraceFile->pName, pName, uNameSize);
     pTraceFile->fd = -1;
-    trc_init_recursive_mutex(&pTraceFile->queueMutex);
-    return pTraceFile;
+    ppTraceFile->reset(pTraceFile);
+    return {};
 }
 
-header_copy_ptr make_header_copy(const char* pName, const trace_file_header& header) {
-    void* const pBlock = malloc(sizeof(header));
-    if (pBlock == nullptr) {
-        warn_insufficient_resources_during_open(pName, sizeof(header));
-        return nullptr;
-    }
-    return header_copy_ptr(new (pBlock) trace_file_header(header));
-}
-
-int not_a_trace_file(const char* pName) {
-    output_err_message("%s: 2625-107 File \"%s\" is not a valid trace file.\n", anchor.pProgName,
-                       pName);
-    return -1;
-}
-
-/// -B: nothing but the name, and the file is left as it stood.
-int list_base_program_name(const trace_file_header& header) {
-    if (header.uVersion < VERSION_WITH_BASE_PROG_NAME)
-        return -1;
-    print_base_program_name(header);
-    return 0;
-}
-
-/// The first file argument sets the time zone, and only then is the -s argument
-/// read: it may give a date and time. Returns 0, or -1 after a message.
-int apply_first_file(const trace_file_header& header) {
-    if (!anchor.bLocalTZ && header.uOffset >= MIN_HDR_SIZE_FOR_TZ &&
-        header.tz_offset != TRC_TZ_NOT_RECORDED) {
-        anchor.tz_offset = header.tz_offset;
-        anchor.bHostTZ = 1;
-        set_tz();
-    }
-    if (anchor.bStartRecOpt == 1 && parse_start(anchor.pStartRecordOptArg) != 0) {
-        output_usage();
-        return -1;
-    }
-    return 0;
-}
-
-/// Gives mapping, descriptor and lock back until the file is read; the header
-/// copy takes the mapping's place.
-void park(trace_file* pTraceFile, header_copy_ptr pCopy) {
-    unmap_trace_file(pTraceFile);
-    pTraceFile->pHeader = pCopy.release();
-    close(pTraceFile->fd);
-    pTraceFile->fd = -1;
+open_result open_and_map(trace_file* pTraceFile) {
+    pTraceFile->bTellsSeldom = pTraceFile->bReadOnly || pTraceFile->pTwins != nullptr;
+    return pTraceFile->pTwins != nullptr ? open_among_twins(pTraceFile) : open_alone(pTraceFile);
 }
 
 } // namespace
 
-int open_trace_file(const char* pName, trace_file** ppTraceFile, TrcPreProcHdrElem* pElem,
-                    int bPrBaseProgName, unsigned int total_files, unsigned int fileIndex) {
-    *ppTraceFile = nullptr;
-    if (total_files > 1)
-        output_message("[%02u] Filename: %s\n", fileIndex, pName);
-    trace_file_ptr pTraceFile = make_trace_file(pName);
-    if (pTraceFile == nullptr || open_lock_map_trace_file(pTraceFile.get()) != 0)
-        return -1;
+void file_closer::operator()(trace_file* pTraceFile) const {
+    close_trace_file(pTraceFile);
+    release_trace_file(pTraceFile);
+}
 
-    trace_file_header header; // the writer may change the mapped one at any time
-    memcpy(&header, pTraceFile->pHeader, sizeof(header));
-    if (!header_is_valid(header, pTraceFile->uSize))
-        return not_a_trace_file(pName);
-    if (bPrBaseProgName)
-        return list_base_program_name(header);
-    header_copy_ptr pCopy = make_header_copy(pName, header);
-    if (pCopy == nullptr)
-        return -1;
-    if (!record_area_is_usable(pTraceFile.get()))
-        return not_a_trace_file(pName);
+open_result open_checked_file(const char* pName, bool bReadOnly, trace_file_ptr* ppTraceFile,
+                              trace_file_header* pHeader) {
+    trace_file_ptr pTraceFile;
+    open_result result = make_trace_file(pName, &pTraceFile);
+    if (result.eOutcome != OPEN_OK)
+        return result;
+    pTraceFile->bReadOnly = bReadOnly;
+    result = open_and_map(pTraceFile.get());
+    if (result.eOutcome != OPEN_OK)
+        return result;
+    memcpy(pHeader, pTraceFile->pHeader, sizeof *pHeader);
+    if (!header_is_valid(*pHeader, pTraceFile->uSize))
+        result = {OPEN_NO_TRACE_FILE};
+    *ppTraceFile = std::move(pTraceFile);
+    return result;
+}
+
+open_result accept_trace_file(trace_file* pTraceFile, const trace_file_header& header,
+                              TrcPreProcHdrElem* pElem) {
+    if (!record_area_is_usable(pTraceFile))
+        return {OPEN_NO_TRACE_FILE};
+    if (!join_twins(pTraceFile))
+        return {OPEN_NO_MEMORY, ENOMEM, SIZE_OF_TWINS};
     pTraceFile->bAccepted = 1;
+    take_header(pTraceFile, header, pElem);
+    return {};
+}
 
-    take_header(pTraceFile.get(), header, pElem);
-    print_file_summary(pName, header, total_files);
-    if (fileIndex == 0 && apply_first_file(header) != 0)
-        return -1;
-    if (!anchor.bFollow)
-        park(pTraceFile.get(), std::move(pCopy));
-    *ppTraceFile = pTraceFile.release();
-    return 0;
+void park_trace_file(trace_file* pTraceFile) {
+    unmap_trace_file(pTraceFile);
+    close_descriptor(pTraceFile);
+}
+
+int open_lock_map_trace_file(trace_file* pTraceFile) {
+    const open_result result = open_and_map(pTraceFile);
+    report_open_failure(pTraceFile->pName, result);
+    return result.eOutcome == OPEN_OK ? 0 : -1;
 }

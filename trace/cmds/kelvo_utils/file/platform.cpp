@@ -4,9 +4,6 @@
 
 namespace {
 
-/// Code of the platform that this program runs on.
-constexpr uint8_t RUNNING_PLATFORM = 2;
-
 /// Display names by platform code.
 constexpr const char* platform_map[] = {
     "Unknown",       "Solaris SPARC",   "Linux x86-64",   "Windows x86",
@@ -34,11 +31,5 @@ int is_BE_unix_platform(uint8_t platform) {
 }
 
 int is_compatible_platform_to_run(uint8_t platform) {
-    if (platform == RUNNING_PLATFORM)
-        return 1;
-    if (is_LE_linux_platform(RUNNING_PLATFORM))
-        return is_LE_linux_platform(platform);
-    if (is_BE_linux_platform(RUNNING_PLATFORM))
-        return is_BE_linux_platform(platform);
-    return platform == 0;
+    return is_LE_linux_platform(platform); // as the one this program runs on, 2
 }

@@ -36,6 +36,22 @@ inline trace_record_header* ring_position(const trace_file* pTraceFile, uint64_t
                                                   uOffset);
 }
 
+/// Where the record of `uLength` bytes at `uOffset` is followed by the next one: at its
+/// end, or at the start of the area when it ends with the file. Not yet tested.
+inline uint64_t ring_next(const trace_file* pTraceFile, uint64_t uOffset, uint32_t uLength) {
+    const uint64_t uNext = uOffset + uLength;
+    return uNext != ring_end(pTraceFile) ? uNext : ring_start(pTraceFile);
+}
+
+/// Lets the record stand for the `uSize` bytes of a trace file at `pBytes`; positions
+/// go by the low 32 bits of the size. The record area begins where the header says.
+inline void ring_map_over(trace_file* pTraceFile, void* pBytes, uint64_t uSize) {
+    pTraceFile->uSize = static_cast<uint32_t>(uSize);
+    pTraceFile->pHeader = static_cast<trace_file_header*>(pBytes);
+    pTraceFile->pMapEnd = ring_position(pTraceFile, pTraceFile->uSize);
+    pTraceFile->pWrap = ring_position(pTraceFile, pTraceFile->pHeader->uOffset);
+}
+
 /// Whether a record header at `uOffset` lies wholly inside the record area.
 inline bool ring_holds_header(const trace_file* pTraceFile, uint64_t uOffset) {
     const uint64_t uEnd = ring_end(pTraceFile);

@@ -9,6 +9,7 @@
 #include "walk.h"
 
 #include "corruption.h"
+#include "reader_words.h"
 #include "ring.h"
 
 #include <algorithm>
@@ -25,15 +26,12 @@ bool counts_in_sequence(const trace_record_header& header) {
 }
 
 /// Whether the reader, standing on the oldest position, has read all there is:
-/// the record is not the next one in sequence, or it is the first of a whole
-/// turn of fillers, which have no place in the sequence and would let the walk
-/// go round for ever. A record that counts is judged by its seqNumber alone, so
-/// that a writer which goes on after such a turn is noticed.
+/// the record is not the next one in sequence. A gap filler never is, though the
+/// numbers of the sequence may happen to reach its own: the ring would be read
+/// again, and one of fillers alone without end.
 bool has_caught_up(const trace_file* pTraceFile, const trace_record_header& header) {
-    if (header.seqNumber != load_seq_lock(pTraceFile->pHeader) ||
-        header.function == TRC_FUNC_WRITING)
-        return true;
-    return !counts_in_sequence(header) && pTraceFile->uUncountedBytes >= ring_size(pTraceFile);
+    return header.seqNumber != pTraceFile->uExpectedSeq || header.function == TRC_FUNC_WRITING ||
+           !counts_in_sequence(header);
 }
 
 /// What is_last_record says of the sound record at pCurRec. `uOldest` was read
@@ -60,10 +58,8 @@ walk_result judge_position(const trace_file* pTraceFile, uint32_t uOldest,
 
 /// Moves pCurRec past the record; the new position is not yet tested.
 void move_past(trace_file* pTraceFile, const trace_record_header& current) {
-    uint64_t uNext = ring_offset(pTraceFile, pTraceFile->pCurRec) + current.length;
-    if (uNext == ring_end(pTraceFile))
-        uNext = ring_start(pTraceFile);
-    pTraceFile->pCurRec = ring_position(pTraceFile, uNext);
+    const uint64_t uOffset = ring_offset(pTraceFile, pTraceFile->pCurRec);
+    pTraceFile->pCurRec = ring_position(pTraceFile, ring_next(pTraceFile, uOffset, current.length));
 }
 
 /// Has the processor fetch what will be read some records later: its own
@@ -75,14 +71,14 @@ void fetch_ahead(const trace_file* pTraceFile) {
     __builtin_prefetch(ring_position(pTraceFile, uAhead));
 }
 
-/// Lets the writer know that the record was passed.
+/// A ring of gap fillers has shown the reader no number; the first record does.
 void count_as_passed(trace_file* pTraceFile, const trace_record_header& passed) {
-    if (counts_in_sequence(passed)) {
-        pTraceFile->uUncountedBytes = 0;
-        store_seq_lock(pTraceFile->pHeader, load_seq_lock(pTraceFile->pHeader) + 2);
-    } else {
-        pTraceFile->uUncountedBytes += passed.length;
+    if (counts_in_sequence(passed)) [[likely]] {
+        if (pTraceFile->uExpectedSeq == TRC_SEQ_FILLER) [[unlikely]]
+            pTraceFile->uExpectedSeq = passed.seqNumber;
+        pTraceFile->uExpectedSeq += 2;
     }
+    tell_place(pTraceFile);
 }
 
 } // namespace
@@ -126,7 +122,7 @@ int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_hea
         warn_out_of_bounds(pTraceFile, pRec);
         return 1;
     }
-    *pHeader = read_record_header(pRec);
+    load_record_header(pRec, pHeader);
     if (record_is_bad(pRec, *pHeader, pTraceFile))
         return 1;
     if (ring_covers_reader_words(uOffset)) [[unlikely]] {
@@ -136,10 +132,11 @@ int current_record_pointer_is_bad(const trace_file* pTraceFile, trace_record_hea
     return 0;
 }
 
-walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader) {
+walk_result is_last_record(trace_file* pTraceFile, trace_record_header* pHeader) {
     const uint32_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
     if (current_record_pointer_is_bad(pTraceFile, pHeader))
         return WALK_CORRUPT;
+    tell_place_now(pTraceFile);
     return judge_position(pTraceFile, uOldest, *pHeader);
 }
 
@@ -149,10 +146,9 @@ bool number_has_come(const trace_file* pTraceFile, trace_record_header* pHeader)
     // The number stands there once the offset has moved beyond the next record.
     const uint64_t uOldest = load_oldest_record_offset(pTraceFile->pHeader);
     pHeader->seqNumber = read_record_header(pTraceFile->pCurRec).seqNumber;
-    uint64_t uEnd = ring_offset(pTraceFile, pTraceFile->pCurRec) + pHeader->length;
-    if (uEnd == ring_end(pTraceFile))
-        uEnd = ring_start(pTraceFile);
-    return pHeader->seqNumber != TRC_SEQ_FILLER || uEnd != uOldest;
+    const uint64_t uOffset = ring_offset(pTraceFile, pTraceFile->pCurRec);
+    return pHeader->seqNumber != TRC_SEQ_FILLER ||
+           ring_next(pTraceFile, uOffset, pHeader->length) != uOldest;
 }
 
 walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_header& current) {
@@ -164,7 +160,8 @@ walk_result step_to_next_record(trace_file* pTraceFile, const trace_record_heade
     return WALK_RECORD;
 }
 
-walk_result step_and_judge(trace_file* pTraceFile, trace_record_header* pHeader) {
+// Once a record: with everything in place, the warnings apart, which are cold.
+[[gnu::flatten]] walk_result step_and_judge(trace_file* pTraceFile, trace_record_header* pHeader) {
     const trace_record_header passed = *pHeader;
     move_past(pTraceFile, passed);
     fetch_ahead(pTraceFile);

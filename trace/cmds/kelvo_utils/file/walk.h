@@ -1,7 +1,8 @@
 // The step round the ring: whether the record at pCurRec may be read, whether
 // the reader has caught up with the writer, and the way to the next record.
 // Works over plain memory: a trace_file whose pName, pHeader, pWrap and pMapEnd
-// are set is all it needs. One reader per file, no lock.
+// are set is all it needs. One reader per file, no lock. The reader's place in the
+// sequence is uExpectedSeq; uSeqLock is stored from it, and never read.
 //
 // Everything is judged, and then worked on, as a copy of the record's header,
 // so that nothing which changes in the mapping meanwhile can move a bound after
@@ -19,7 +20,9 @@ uint32_t get_record_offset(const trace_file* pTraceFile, const trace_record_head
 /// A copy of the header at `pRec`, each word read once. `pRec` must leave 28
 /// bytes before pMapEnd.
 inline trace_record_header read_record_header(const trace_record_header* pRec) {
-    return load_record_header(pRec);
+    trace_record_header header;
+    load_record_header(pRec, &header);
+    return header;
 }
 
 /// The bytes of the record at `pRec` whose length field was read as `length`:
@@ -46,8 +49,8 @@ enum walk_result : int {
 
 /// Whether a record can be read at pCurRec; fills `pHeader` with the copy of
 /// its header that was judged and is to be worked on. May be asked again at the
-/// same position any number of times.
-walk_result is_last_record(const trace_file* pTraceFile, trace_record_header* pHeader);
+/// same position any number of times; stores uSeqLock anew each time.
+walk_result is_last_record(trace_file* pTraceFile, trace_record_header* pHeader);
 
 /// Whether the record at pCurRec, found readable and copied to `pHeader`, has
 /// its seqNumber: the writer stores it a moment after the record can be read.

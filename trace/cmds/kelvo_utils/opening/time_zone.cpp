@@ -1,4 +1,4 @@
-#include "open.h"
+#include "opening.h"
 
 #include <cstdio>
 #include <cstdlib>

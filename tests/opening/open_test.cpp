@@ -1,7 +1,9 @@
-#include "open.h"
+#include "opening.h"
 
 #include "first_record.h"
+#include "identity.h"
 #include "raw_trace.h"
+#include "reader_words.h"
 #include "stdout_stream.h"
 #include "temp_dir.h"
 #include "walk.h"
@@ -65,10 +67,15 @@ protected:
 
     opened open_file(int bPrBaseProgName = 0, unsigned int total_files = 1,
                      unsigned int fileIndex = 0) {
+        return open_path(path, bPrBaseProgName, total_files, fileIndex);
+    }
+
+    static opened open_path(const std::string& name, int bPrBaseProgName = 0,
+                            unsigned int total_files = 1, unsigned int fileIndex = 0) {
         opened result;
         CaptureStdout();
         CaptureStderr();
-        result.iResult = open_trace_file(path.c_str(), &result.pFile, &result.elem, bPrBaseProgName,
+        result.iResult = open_trace_file(name.c_str(), &result.pFile, &result.elem, bPrBaseProgName,
                                          total_files, fileIndex);
         stdout_flush();
         result.out = GetCapturedStdout();
@@ -85,8 +92,8 @@ protected:
 
     static void end(const opened& file) {
         ASSERT_EQ(file.iResult, 0) << file.err;
-        close_trace_file(file.pFile, 0);
-        close_trace_file(file.pFile, 0); // harmless
+        close_trace_file(file.pFile);
+        close_trace_file(file.pFile); // harmless
         release_trace_file(file.pFile);
     }
 
@@ -103,6 +110,31 @@ protected:
         struct stat status {};
         EXPECT_EQ(stat(path.c_str(), &status), 0);
         return status.st_mtim;
+    }
+
+    /// Whether this process holds a lock on the file, as another one sees it.
+    bool is_locked() const {
+        const pid_t asker = fork();
+        if (asker == 0) {
+            struct flock lock {};
+            lock.l_type = F_WRLCK;
+            fcntl(open(path.c_str(), O_RDWR), F_GETLK, &lock);
+            _exit(lock.l_type != F_UNLCK);
+        }
+        int state = -1;
+        EXPECT_EQ(waitpid(asker, &state, 0), asker);
+        return state != 0;
+    }
+
+    /// Walks to the end and says how many records there were.
+    static int read_all(trace_file* pFile) {
+        trace_record_header header;
+        int iRecords = 0;
+        walk_result here = is_last_record(pFile, &header);
+        for (; here == WALK_RECORD; here = step_and_judge(pFile, &header))
+            iRecords += header.function != TRC_FUNC_FILLER;
+        EXPECT_EQ(is_last_record(pFile, &header), WALK_NO_RECORD);
+        return iRecords;
     }
 
     const temp_dir dir;
@@ -242,7 +274,6 @@ TEST_F(Open, parks_the_file_until_its_turn_and_closes_it_with_its_times) {
     trace_file* const pFile = file.pFile;
     ASSERT_EQ(file.iResult, 0);
     EXPECT_EQ(pFile->fd, -1);
-    EXPECT_EQ(pFile->pHeader->uActualFileSize, 400U);
     EXPECT_FALSE(is_mapped());
     EXPECT_TRUE(read_file(path) == raw.bytes());
 
@@ -271,6 +302,147 @@ TEST_F(Open, reads_a_parked_file_that_has_shrunk_within_its_bounds) {
         EXPECT_THAT(GetCapturedStderr(),
                     HasSubstr(iSize < 200 ? "2625-105" : "pCurRec out of bounds"));
         end(file);
+    }
+}
+
+TEST_F(Open, of_twins_shares_one_lock_and_keeps_the_words_of_the_slowest) {
+    raw_trace raw(10000);
+    for (uint32_t uNumber = 6; uNumber < 6 + 2 * 200; uNumber += 2)
+        raw.add({.seqNumber = uNumber, .body = raw_bytes(7U)});
+    raw.header.uOldestRecordOffset = raw.add_rest();
+    ASSERT_TRUE(raw.write(path));
+    ASSERT_EQ(link(path.c_str(), dir.file("b.trc").c_str()), 0);
+    const size_t uClosed = count_descriptors();
+    const opened twins[] = {open_file(), open_path(dir.file("b.trc")), open_file()};
+    trace_file* const pFirst = twins[0].pFile;
+    trace_file* const pLast = twins[2].pFile;
+    for (const opened& twin : twins) {
+        ASSERT_EQ(open_lock_map_trace_file(twin.pFile), 0);
+        raise_tail_request(twin.pFile);
+        ASSERT_EQ(find_first_record(twin.pFile), 0);
+    }
+    EXPECT_EQ(count_descriptors(), uClosed + 1);
+    const trace_file_header& header = *pFirst->pHeader;
+    lower_tail_request(pFirst);
+    lower_tail_request(pLast);
+    EXPECT_EQ(header.uTailReq, TRC_TAIL_REQUESTED);
+    close_trace_file(twins[1].pFile); // it never reads
+    EXPECT_EQ(header.uTailReq, 0U);
+
+    EXPECT_EQ(read_all(pLast), 200);
+    EXPECT_EQ(header.uSeqLock, 6U) << "the other one has not moved";
+    EXPECT_EQ(read_all(pFirst), 200);
+    EXPECT_EQ(header.uSeqLock, 406U);
+    pLast->timeStampIsValid = 1;
+    pLast->modTime = {1'234'567'890, 0};
+    end(twins[2]);
+    EXPECT_TRUE(is_locked()) << "by the one that is left";
+    EXPECT_EQ(header.uSeqLock, 406U);
+    end(twins[0]);
+    EXPECT_FALSE(is_locked());
+    end(twins[1]);
+    EXPECT_TRUE(read_file(path) == raw.bytes());
+    EXPECT_EQ(modification_time().tv_sec, 1'234'567'890) << "the latest of all";
+}
+
+TEST_F(Open, gives_up_a_file_that_was_replaced_and_leaves_the_new_one_alone) {
+    const std::string other = dir.file("b.trc");
+    for (const bool bIsRead : {false, true}) {
+        const opened file = open_file(sound_trace());
+        ASSERT_TRUE(sound_trace().write(other));
+        const opened reading = open_path(other);
+        if (bIsRead) {
+            ASSERT_EQ(open_lock_map_trace_file(reading.pFile), 0);
+            ASSERT_EQ(unlink(path.c_str()), 0);
+            ASSERT_EQ(link(other.c_str(), path.c_str()), 0);
+        } else { // the new one may get the inode of the old one
+            ASSERT_EQ(unlink(path.c_str()), 0);
+            ASSERT_TRUE(sound_trace().write(path));
+        }
+        const timespec before = modification_time();
+        CaptureStderr();
+        EXPECT_EQ(open_lock_map_trace_file(file.pFile), -1);
+        EXPECT_EQ(GetCapturedStderr(),
+                  "kelvo: 2625-164 File \"" + path + "\" was replaced before it was read.\n\n");
+        end(file);
+        EXPECT_EQ(is_locked(), bIsRead);
+        EXPECT_TRUE(read_file(path) == sound_trace().bytes());
+        EXPECT_EQ(modification_time().tv_nsec, before.tv_nsec);
+        end(reading);
+    }
+}
+
+TEST_F(Open, follows_one_file_once_and_keeps_its_lock) {
+    anchor.bFollow = 1;
+    const opened file = open_file(sound_trace());
+    const std::string other = dir.file("b.trc");
+    ASSERT_EQ(symlink(path.c_str(), other.c_str()), 0);
+    const opened again = open_path(other);
+    EXPECT_EQ(again.iResult, -1);
+    EXPECT_EQ(again.out, "kelvo: 2625-161 Trace file \"" + other + "\" is already in use.\n");
+    EXPECT_TRUE(is_locked());
+    end(file);
+}
+
+TEST_F(Open, stores_nothing_in_a_file_that_is_only_read) {
+    const raw_trace raw = sound_trace();
+    ASSERT_TRUE(raw.write(path));
+    const timespec before = modification_time();
+    trace_file_ptr pFile;
+    trace_file_header header;
+    TrcPreProcHdrElem elem{};
+    ASSERT_EQ(open_checked_file(path.c_str(), true, &pFile, &header).eOutcome, OPEN_OK);
+    ASSERT_EQ(accept_trace_file(pFile.get(), header, &elem).eOutcome, OPEN_OK);
+    EXPECT_FALSE(is_locked());
+    raise_tail_request(pFile.get());
+    EXPECT_EQ(find_first_record(pFile.get()), 0);
+    EXPECT_EQ(read_all(pFile.get()), 1);
+    pFile->pHeader->uSeqLock = 4711; // whoever stores all the same
+    pFile->timeStampIsValid = 1;
+    pFile = nullptr;
+    EXPECT_TRUE(read_file(path) == raw.bytes());
+    EXPECT_EQ(modification_time().tv_nsec, before.tv_nsec);
+}
+
+TEST_F(Open, waits_for_a_lease_that_is_called_back) {
+    ASSERT_TRUE(sound_trace().write(path));
+    const pid_t holder = fork();
+    ASSERT_GE(holder, 0);
+    if (holder == 0) {
+        sigset_t called;
+        sigemptyset(&called);
+        sigaddset(&called, SIGIO);
+        sigprocmask(SIG_BLOCK, &called, nullptr);
+        const int fd = open(path.c_str(), O_RDWR);
+        if (fcntl(fd, F_SETLEASE, F_WRLCK) != 0)
+            _exit(1);
+        raise(SIGSTOP);
+        sigwaitinfo(&called, nullptr);
+        usleep(20'000);
+        _exit(0);
+    }
+    int state = 0;
+    ASSERT_EQ(waitpid(holder, &state, WUNTRACED), holder);
+    if (!WIFSTOPPED(state))
+        GTEST_SKIP() << "no leases here";
+    kill(holder, SIGCONT);
+    end(open_file());
+    EXPECT_EQ(waitpid(holder, &state, 0), holder);
+    EXPECT_EQ(state, 0) << "it was asked";
+}
+
+TEST(Identity, finds_each_of_many_files) {
+    std::vector<trace_file> files(1000);
+    for (size_t i = 0; i < files.size(); ++i) {
+        files[i].identity = {i % 3, i * 64, 0, 0};
+        EXPECT_EQ(find_accepted_file(files[i].identity), nullptr);
+        enter_accepted_file(&files[i]);
+    }
+    for (trace_file& file : files) {
+        EXPECT_EQ(find_accepted_file(file.identity), &file);
+        forget_accepted_file(&file);
+        forget_accepted_file(&file); // harmless
+        EXPECT_EQ(find_accepted_file(file.identity), nullptr);
     }
 }
 

@@ -1,0 +1,30 @@
+// The two words of the file header that a reader stores: uSeqLock, which says what
+// it has passed, and uTailReq, by which it asks for the oldest record.
+//
+// One mapping, one reader: the words are stored as the reader moves. Of twins, which
+// read one mapping, uSeqLock is that of the slowest, stored now and then, since
+// storing it late only holds the writer back; and uTailReq stays raised while any of
+// them asks (see twins.h). A file that is only read has no words stored.
+#pragma once
+
+#include "kelvo.h"
+#include "shared_words.h"
+
+/// For a file with bTellsSeldom.
+[[gnu::cold]] void tell_place_seldom(trace_file* pTraceFile);
+
+/// At every step. The word is stored whole: whatever somebody else stored in it is
+/// gone with the next step.
+inline void tell_place(trace_file* pTraceFile) {
+    if (!pTraceFile->bTellsSeldom) [[likely]]
+        store_seq_lock(pTraceFile->pHeader, pTraceFile->uExpectedSeq);
+    else
+        tell_place_seldom(pTraceFile);
+}
+
+/// The same at once, for twins too: when the reader is going to rest.
+void tell_place_now(trace_file* pTraceFile);
+
+/// Before the search for the first record, and behind it.
+void raise_tail_request(trace_file* pTraceFile);
+void lower_tail_request(trace_file* pTraceFile);
