@@ -70,8 +70,11 @@ live_command::live_command(const std::vector<std::string>& arguments, const comm
     argv.push_back(nullptr);
     int out[2] = {-1, -1};
     int err[2] = {-1, -1};
-    if (pipe2(out, O_CLOEXEC) == 0 && pipe2(err, O_CLOEXEC) == 0)
+    if (pipe2(out, O_CLOEXEC) == 0 && pipe2(err, O_CLOEXEC) == 0) {
+        if (setup.bStderrGone)
+            close_fd(err[0]);
         m_pid = fork();
+    }
     if (m_pid == 0)
         become_program(setup, argv.data(), out[1], err[1]);
     if (m_pid < 0)

@@ -17,6 +17,7 @@ struct command_setup {
     std::string sDirectory{}; ///< working directory; empty: the test's
     std::string sStdout{}; ///< file that standard output is added to, not captured; empty: captured
     bool bStdoutClosed = false; ///< the program starts without standard output
+    bool bStderrGone = false;   ///< nobody reads standard error
 };
 
 struct command_result {

@@ -1,14 +1,11 @@
 // Entry of the command: command line, run, end of standard output.
 
 #include "cleanup.h"
-#include "kelvo.h"
-#include "messages.h"
 #include "options.h"
 #include "run.h"
 #include "signals.h"
 #include "stdout_stream.h"
 
-#include <cerrno>
 #include <cstdlib>
 #include <fcntl.h>
 #include <unistd.h>
@@ -28,17 +25,13 @@ void occupy_standard_descriptors() {
 }
 
 /// Writes out what is still buffered and reports, once, what could not be
-/// written. A reader of our pipe that has gone is no error. Returns the exit
-/// status.
+/// written. Returns the exit status.
 int end_standard_output(int bError) {
+    let_second_signal_through();
     stdout_flush();
     if (pending_signal() != 0)
         return 0;
-    const int syserr = stdout_error();
-    if (syserr == 0 || syserr == EPIPE)
-        return bError;
-    output_sys_message("%s: 2625-163 Error writing standard output, ", syserr, anchor.pProgName);
-    return 1;
+    return stdout_report_loss() ? 1 : bError;
 }
 
 } // namespace

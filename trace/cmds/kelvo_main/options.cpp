@@ -1,5 +1,6 @@
 #include "options.h"
 
+#include "broken_pipe.h"
 #include "kelvo.h"
 #include "messages.h"
 #include "usage.h"
@@ -99,6 +100,12 @@ void take_option(int letter, command_line* pCommand) {
     }
 }
 
+/// As getopt, which writes to standard error itself.
+int next_option(int argc, char** argv) {
+    const broken_pipe_guard quiet;
+    return getopt(argc, argv, OPTION_STRING);
+}
+
 /// Reports every file that cannot be read. Returns 0, or 1 when there was one.
 int check_files(std::span<char*> files) {
     int bError = 0;
@@ -124,7 +131,7 @@ bool read_command_line(int argc, char** argv, command_line* pCommand) {
     anchor.pProgName = argc > 0 ? argv[0] : "";
     memory_is_restricted = getenv("KELVO_USE_LOWMEM") != nullptr;
 
-    for (int letter; (letter = getopt(argc, argv, OPTION_STRING)) != -1;)
+    for (int letter; (letter = next_option(argc, argv)) != -1;)
         take_option(letter, pCommand);
     if (optind < argc)
         pCommand->files = {argv + optind, argv + argc};

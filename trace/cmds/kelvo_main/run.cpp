@@ -207,6 +207,7 @@ int run(const command_line& command) {
         return end_run(1);
     if (sigsetjmp(anchor.sigbuf, 1) != 0) {
         // Readers still run: their memory is left to the end of the process.
+        let_second_signal_through();
         write_handed_over_output();
         return 0;
     }

@@ -13,10 +13,12 @@
 #include "cleanup.h"
 #include "kelvo.h"
 #include "messages.h"
+#include "write_all.h"
 
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
+#include <ctime>
 #include <iterator>
 #include <poll.h>
 #include <unistd.h>
@@ -31,11 +33,19 @@ constexpr int TERMINATING_SIGNALS[] = {SIGINT, SIGQUIT, SIGTSTP, SIGTTIN, SIGTTO
 /// may be waiting for a pipe.
 constexpr int MOST_FORWARDED_FAULTS = 500;
 
+/// How old the first terminating signal has to be for a second one to end the
+/// process in the middle of its work: the main thread may be waiting for another
+/// one, which waits for an output.
+constexpr int64_t LONGEST_WORK_MS = 1000;
+
 std::atomic<int> iPendingSignal{0};
+std::atomic<int64_t> iFirstSignalMs{0}; // when the first terminating signal came; 0: none has
+std::atomic<bool> bJumped{false};
 std::atomic<bool> bMainThreadWaits{false};
 std::atomic<int> iReaderFault{0}; // signal of a fault that recurs on another thread
 std::atomic<int> iForwardedFaults{0};
-static_assert(std::atomic<int>::is_always_lock_free && std::atomic<bool>::is_always_lock_free,
+static_assert(std::atomic<int>::is_always_lock_free && std::atomic<bool>::is_always_lock_free &&
+                  std::atomic<int64_t>::is_always_lock_free,
               "used in signal handlers");
 
 bool on_main_thread() {
@@ -45,8 +55,21 @@ bool on_main_thread() {
 [[noreturn]] void jump_to_end(int signo) {
     bMainThreadWaits = false;
     iPendingSignal = 0;
+    bJumped = true;
     bReadersMayRun = true;
     siglongjmp(anchor.sigbuf, signo);
+}
+
+int64_t now_ms() {
+    timespec now{};
+    clock_gettime(CLOCK_MONOTONIC, &now);
+    return now.tv_sec * int64_t{1000} + now.tv_nsec / 1'000'000;
+}
+
+/// Lets nothing that stands still hold up the end that was asked for again.
+void insist_on_end() {
+    if (!write_only_while_output_moves() && now_ms() - iFirstSignalMs > LONGEST_WORK_MS)
+        _exit(0);
 }
 
 void handle_terminating_signal(int signo) {
@@ -54,9 +77,15 @@ void handle_terminating_signal(int signo) {
         pthread_kill(anchor.threadId, signo);
         return;
     }
+    const bool bFirst = iFirstSignalMs == 0;
+    if (bFirst)
+        iFirstSignalMs = now_ms();
     if (bMainThreadWaits)
         jump_to_end(signo);
-    iPendingSignal = signo;
+    if (!bJumped)
+        iPendingSignal = signo;
+    if (!bFirst)
+        insist_on_end();
 }
 
 /// Whether the signal comes from the instruction that the thread executes, and
@@ -162,4 +191,14 @@ void main_thread_sleep(int64_t microseconds) {
     if (output.revents & (POLLERR | POLLHUP))
         jump_to_end(SIGPIPE);
     bOutputIsOpen = false;
+}
+
+void let_second_signal_through() {
+    if (!bJumped)
+        return;
+    sigset_t set;
+    sigemptyset(&set);
+    for (const int signo : TERMINATING_SIGNALS)
+        sigaddset(&set, signo);
+    pthread_sigmask(SIG_UNBLOCK, &set, nullptr);
 }

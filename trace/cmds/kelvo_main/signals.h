@@ -5,7 +5,8 @@
 // A terminating signal never interrupts the allocator or the output stream: the
 // handler jumps only while the main thread waits (main_thread_sleep), otherwise
 // it leaves a note that take_pending_signal acts on. Other threads send their
-// signals on to the main thread.
+// signals on to the main thread. When a second one comes and nobody takes the
+// output that the first one waits for, the process ends at once, with status 0.
 //
 // anchor.threadId and anchor.sigbuf are set before the handlers are installed,
 // and the function that set anchor.sigbuf must not have returned when one of
@@ -37,3 +38,8 @@ void take_pending_signal();
 /// reader of its pipe has gone the run ends as by SIGPIPE. Main thread, no mutex
 /// held.
 void main_thread_sleep(int64_t microseconds);
+
+/// After a jump, which leaves all signals blocked: unblocks the terminating ones,
+/// so that a second one ends a run whose last text nobody takes. Does nothing
+/// when no signal has ended the run. Main thread, any number of times.
+void let_second_signal_through();

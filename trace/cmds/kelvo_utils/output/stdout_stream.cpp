@@ -1,5 +1,7 @@
 #include "stdout_stream.h"
 
+#include "kelvo.h"
+#include "messages.h"
 #include "write_all.h"
 
 #include <algorithm>
@@ -16,6 +18,7 @@ enum class terminal_state { UNKNOWN, NO, YES };
 struct {
     size_t uUsed = 0; // always below BUFFER_SIZE between calls
     int iError = 0;
+    bool bErrorReported = false;
     terminal_state terminal = terminal_state::UNKNOWN;
     alignas(4096) char pBuffer[BUFFER_SIZE];
 } stream;
@@ -86,6 +89,8 @@ void stdout_flush() {
     if (stream.iError == 0)
         stream.iError = write_all(STDOUT_FILENO, {stream.pBuffer, stream.uUsed});
     stream.uUsed = 0;
+    if (anchor.bFollow)
+        stdout_report_loss(); // the end may be days away
 }
 
 bool stdout_is_empty() {
@@ -96,8 +101,19 @@ int stdout_error() {
     return stream.iError;
 }
 
+bool stdout_report_loss() {
+    if (stream.iError == 0 || stream.iError == EPIPE)
+        return false;
+    if (!stream.bErrorReported)
+        output_sys_message("%s: 2625-163 Error writing standard output, ", stream.iError,
+                           anchor.pProgName);
+    stream.bErrorReported = true;
+    return true;
+}
+
 void stdout_reset() {
     stream.uUsed = 0;
     stream.iError = 0;
+    stream.bErrorReported = false;
     stream.terminal = terminal_state::UNKNOWN;
 }

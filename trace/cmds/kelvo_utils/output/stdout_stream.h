@@ -27,7 +27,8 @@ char* stdout_begin_room(size_t count);
 void stdout_end_room(const char* pEnd);
 
 /// Writes everything appended so far. Interrupted and partial writes go on
-/// where they stopped. After the first failed write the stream drops all text.
+/// where they stopped. After the first failed write the stream drops all text;
+/// in follow mode that is reported at once, as stdout_report_loss does.
 void stdout_flush();
 
 /// Whether nothing is waiting in the buffer.
@@ -35,6 +36,10 @@ bool stdout_is_empty();
 
 /// errno of the first failed write, 0 when none failed.
 int stdout_error();
+
+/// Whether text was lost by a failed write; a reader of our pipe that has gone is
+/// no loss. The first time also says so, with message 2625-163.
+bool stdout_report_loss();
 
 /// Starts afresh on what is descriptor 1 now: buffered text and a remembered
 /// error are dropped, and whether it is a terminal is found out anew.
