@@ -1,15 +1,16 @@
 // Makes traces whose records are 64 bytes long: seven numbers each.
 //
-//   kelvo_make_values DIRECTORY FILES RECORDS interleave|sequential|groups
+//   kelvo_make_values DIRECTORY FILES RECORDS-OF-EACH interleave|sequential|groups
 //
-// RECORDS is per file, on the average with groups: there some records in a row
-// are in one file, the next in another, at random. The template goes beside the
-// traces. The floor has the same template compiled in.
+// With groups, some records in a row are in one file, the next in another, at
+// random; then the files have so many records on the average. The template goes
+// beside the traces. The floor has the same template compiled in.
 #include "trace_writer.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -102,7 +103,8 @@ std::vector<std::vector<record_group>> plan_files(uint32_t uFiles, uint64_t uRec
 
 int main(int argc, char** argv) {
     if (argc != 5) {
-        fputs("Usage: kelvo_make_values DIRECTORY FILES RECORDS interleave|sequential|groups\n",
+        fputs("Usage: kelvo_make_values DIRECTORY FILES RECORDS-OF-EACH "
+              "interleave|sequential|groups\n",
               stderr);
         return 1;
     }
@@ -111,6 +113,13 @@ int main(int argc, char** argv) {
     const uint64_t uRecords = strtoull(argv[3], nullptr, 10);
     if (uFiles == 0 || uRecords > (UINT32_MAX - 1024) / RECORD_LENGTH) {
         fputs("kelvo_make_values: no trace file can be made so\n", stderr);
+        return 1;
+    }
+    // A file that has no room on the disk would end this program by a signal only
+    // when the disk is full.
+    std::error_code error;
+    if (std::filesystem::space(directory, error).available / RECORD_LENGTH / uFiles < uRecords) {
+        fputs("kelvo_make_values: not enough room for so many files of so many records\n", stderr);
         return 1;
     }
     const auto files = plan_files(uFiles, uRecords, argv[4]);

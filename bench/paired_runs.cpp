@@ -31,9 +31,14 @@ program_pair::program_pair(const std::string& sKelvo, const std::string& sDirect
 paired_runs::paired_runs(const run_settings& settings, const program_pair& programs,
                          const std::string& sDirectory) {
     for (unsigned u = 0; u < settings.uRepeat; ++u)
-        for (size_t i = 0; i < 2; ++i)
-            runs[i].push_back(
-                run_measured(programs.words[i], settings.target, sDirectory + "/output.txt"));
+        run_once(settings, programs, sDirectory);
+}
+
+void paired_runs::run_once(const run_settings& settings, const program_pair& programs,
+                           const std::string& sDirectory) {
+    for (size_t i = 0; i < 2; ++i)
+        runs[i].push_back(
+            run_measured(programs.words[i], settings.target, sDirectory + "/output.txt"));
 }
 
 double paired_runs::median(size_t uProgram, double run_cost::*pFigure) const {

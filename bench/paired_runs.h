@@ -29,9 +29,14 @@ struct program_pair {
 struct paired_runs {
     std::vector<run_cost> runs[2];
 
-    /// Runs each `uRepeat` times, in turn. Output to a file goes into `sDirectory`.
+    paired_runs() = default;
+    /// Runs each `uRepeat` times, in turn.
     paired_runs(const run_settings& settings, const program_pair& programs,
                 const std::string& sDirectory);
+
+    /// Runs both once more. Output to a file goes into `sDirectory`.
+    void run_once(const run_settings& settings, const program_pair& programs,
+                  const std::string& sDirectory);
 
     /// Median of a figure of one program.
     double median(size_t uProgram, double run_cost::*pFigure) const;

@@ -6,7 +6,7 @@
 #include <chrono>
 #include <cstdio>
 #include <exception>
-#include <map>
+#include <optional>
 #include <poll.h>
 #include <sstream>
 #include <string_view>
@@ -40,37 +40,40 @@ public:
 
 private:
     void merge_row(unsigned uFiles, uint64_t uPerFile, const char* pTimes);
-    double rate_of_one_file(size_t uProgram, uint64_t uRecords);
+    const std::string& one_file(uint64_t uRecords);
 
     const run_settings& m_settings;
     const sweep_settings& m_sweep;
-    std::map<uint64_t, paired_runs> m_oneFile; ///< by its records
+    std::optional<temp_directory> m_oneFile;
+    uint64_t m_uRecordsInOne = 0;
 };
 
-/// Millions of records a second when all are in one file.
-double file_sweep::rate_of_one_file(size_t uProgram, uint64_t uRecords) {
-    auto pRuns = m_oneFile.find(uRecords);
-    if (pRuns == m_oneFile.end()) {
-        const temp_directory directory(m_settings.temp);
-        make_values(directory.path(), 1, uRecords, "sequential");
-        const program_pair programs(m_settings.kelvo, directory.path());
-        pRuns =
-            m_oneFile.emplace(uRecords, paired_runs(m_settings, programs, directory.path())).first;
+/// A directory with all records in one file.
+const std::string& file_sweep::one_file(uint64_t uRecords) {
+    if (m_uRecordsInOne != uRecords) {
+        m_uRecordsInOne = uRecords;
+        m_oneFile.emplace(m_settings.temp);
+        make_values(m_oneFile->path(), 1, uRecords, "sequential");
     }
-    return static_cast<double>(uRecords) / 1e6 / pRuns->second.median(uProgram, &run_cost::wall);
+    return m_oneFile->path();
 }
 
 void file_sweep::merge_row(unsigned uFiles, uint64_t uPerFile, const char* pTimes) {
     const temp_directory directory(m_settings.temp);
     const uint64_t uRecords = make_values(directory.path(), uFiles, uPerFile, pTimes);
     const program_pair programs(m_settings.kelvo, directory.path());
+    const program_pair onOneFile(m_settings.kelvo, one_file(uRecords));
     const comparison same = compare_outputs(programs.words[0], programs.words[1]);
-    const paired_runs runs(m_settings, programs, directory.path());
+    paired_runs runs, ofOneFile;
+    for (unsigned u = 0; u < m_settings.uRepeat; ++u) {
+        ofOneFile.run_once(m_settings, onOneFile, directory.path());
+        runs.run_once(m_settings, programs, directory.path());
+    }
     const auto records = static_cast<double>(uRecords);
     double rates[2], shares[2];
     for (size_t i = 0; i < 2; ++i) {
         rates[i] = records / 1e6 / runs.median(i, &run_cost::wall);
-        shares[i] = rates[i] / rate_of_one_file(i, uRecords);
+        shares[i] = ofOneFile.median(i, &run_cost::wall) / runs.median(i, &run_cost::wall);
     }
     printf(" %8.3f %8.3f %6.2f %8.1f %9.1f %7llu %8.0f %9.3f %6.2f %7.2f %7.2f\n", records / 1e6,
            rates[0], shares[0], runs.median(0, &run_cost::cpu) * 1e9 / records,
