@@ -8,6 +8,8 @@
 #include <cstring>
 #include <ctime>
 #include <fcntl.h>
+#include <filesystem>
+#include <fstream>
 #include <memory>
 #include <stdexcept>
 #include <sys/resource.h>
@@ -77,14 +79,29 @@ size_t read_some(int fd, char* pBuffer, size_t uSize) {
     }
 }
 
+std::string process_path(pid_t pid) {
+    return "/proc/" + std::to_string(pid);
+}
+
+/// The number behind a name in a status file of /proc; 0 when there is none.
+uint64_t status_field(const std::string& sPath, const std::string& sName) {
+    std::ifstream status(sPath);
+    for (std::string sLine; std::getline(status, sLine);)
+        if (sLine.starts_with(sName))
+            return strtoull(sLine.c_str() + sName.size(), nullptr, 10);
+    return 0;
+}
+
 } // namespace
 
 void give_up(const std::string& sWhy) {
     throw std::runtime_error(sWhy);
 }
 
-piped_child::piped_child(const command_words& words) {
-    const pipe_ends ends = make_pipe();
+piped_child::piped_child(const command_words& words, const std::string& sFile) {
+    const pipe_ends ends = sFile.empty()
+                               ? make_pipe()
+                               : pipe_ends{-1, open_target(output_target::REGULAR_FILE, sFile)};
     fd = ends.reading;
     pid = start(words, ends.writing);
 }
@@ -92,11 +109,12 @@ piped_child::piped_child(const command_words& words) {
 piped_child::~piped_child() {
     if (pid > 0)
         terminate();
-    close(fd);
+    if (fd >= 0)
+        close(fd);
 }
 
 size_t piped_child::read(char* pBuffer, size_t uSize) {
-    look_at_memory();
+    look();
     size_t uRead = 0;
     while (uRead < uSize) {
         const size_t uPart = read_some(fd, pBuffer + uRead, uSize - uRead);
@@ -128,14 +146,17 @@ uint64_t piped_child::cpu_time() const {
     return static_cast<uint64_t>(time.tv_sec) * 1'000'000'000 + static_cast<uint64_t>(time.tv_nsec);
 }
 
-void piped_child::look_at_memory() {
-    const std::string sStatus = "/proc/" + std::to_string(pid) + "/status";
-    const std::unique_ptr<FILE, int (*)(FILE*)> file(fopen(sStatus.c_str(), "re"), fclose);
-    char line[256];
-    unsigned long long uKilobytes = 0;
-    while (file != nullptr && fgets(line, sizeof line, file.get()) != nullptr)
-        if (sscanf(line, "RssAnon: %llu", &uKilobytes) == 1)
-            uPrivate = std::max<uint64_t>(uPrivate, uKilobytes * 1024);
+void piped_child::look() {
+    const std::string sStatus = process_path(pid) + "/status";
+    uPrivate = std::max(uPrivate, 1024 * status_field(sStatus, "RssAnon:"));
+    uThreads = std::max(uThreads, status_field(sStatus, "Threads:"));
+}
+
+uint64_t piped_child::waits() const {
+    uint64_t uWaits = 0;
+    for (const auto& thread : std::filesystem::directory_iterator(process_path(pid) + "/task"))
+        uWaits += status_field(thread.path().string() + "/status", "voluntary_ctxt_switches:");
+    return uWaits;
 }
 
 run_cost run_measured(const command_words& words, output_target target, const std::string& sFile) {
@@ -156,7 +177,7 @@ run_cost run_measured(const command_words& words, output_target target, const st
     const std::chrono::duration<double> wall = clock::now() - begin;
     check_status(status, words[0]);
     return {wall.count(), seconds(usage.ru_utime) + seconds(usage.ru_stime),
-            static_cast<double>(usage.ru_maxrss) * 1024};
+            static_cast<double>(usage.ru_maxrss) * 1024, static_cast<double>(usage.ru_nvcsw)};
 }
 
 void run_quietly(const command_words& words) {
@@ -179,6 +200,7 @@ comparison compare_outputs(const command_words& first, const command_words& seco
     for (size_t i = 0; i < 2; ++i) {
         children[i].finish();
         result.uPrivate[i] = children[i].private_memory();
+        result.uThreads[i] = children[i].threads();
     }
     return result;
 }

@@ -17,21 +17,24 @@ struct run_cost {
     double wall = 0;
     double cpu = 0;         ///< user and system, all threads
     double maxResident = 0; ///< mapped files included
+    double waits = 0;       ///< times that a thread gave its processor up by itself
 };
 
 [[noreturn]] void give_up(const std::string& sWhy);
 
-/// A child whose standard output comes through a pipe.
+/// A child whose standard output comes through a pipe, or goes to `sFile`.
 class piped_child {
 public:
-    explicit piped_child(const command_words& words);
+    explicit piped_child(const command_words& words, const std::string& sFile = "");
     piped_child(const piped_child&) = delete;
     piped_child& operator=(const piped_child&) = delete;
     ~piped_child();
 
-    /// Fills the buffer, less at the end of the output only. Notes the memory
-    /// in use now and then.
+    /// Fills the buffer, less at the end of the output only. Looks at the child
+    /// before.
     size_t read(char* pBuffer, size_t uSize);
+    /// Notes the memory and the threads in use.
+    void look();
     /// Waits for the end, which must be good.
     void finish();
     void terminate();
@@ -45,13 +48,19 @@ public:
     uint64_t private_memory() const {
         return uPrivate;
     }
+    /// Most threads seen.
+    uint64_t threads() const {
+        return uThreads;
+    }
+    /// How often its threads gave their processors up by themselves so far, those
+    /// that have ended left out.
+    uint64_t waits() const;
 
 private:
-    void look_at_memory();
-
     pid_t pid = -1;
     int fd = -1;
     uint64_t uPrivate = 0;
+    uint64_t uThreads = 0;
 };
 
 /// Runs a program to its good end. For output_target::REGULAR_FILE, `sFile` is written.
@@ -63,7 +72,8 @@ void run_quietly(const command_words& words);
 /// What the comparison of two outputs saw.
 struct comparison {
     uint64_t uBytes = 0;
-    uint64_t uPrivate[2] = {}; ///< see piped_child::private_memory
+    uint64_t uPrivate[2] = {}; ///< see piped_child
+    uint64_t uThreads[2] = {};
 };
 
 /// Runs both programs and compares what they write; ends the benchmark when

@@ -2,14 +2,17 @@
 // what both cost and how they compare. See --help.
 #include "child.h"
 #include "follow.h"
+#include "live_load.h"
+#include "paired_runs.h"
+#include "sweep.h"
 #include "temp_directory.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
-#include <filesystem>
 #include <getopt.h>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -30,26 +33,32 @@ bytes (kelvo_floor), after a check that the bytes are the same.
   --follow[=S]   also the cost of following 8 idle files for S seconds
                  (default 30), and how soon a record then comes out
   --all          both
-  --none         none of the comparisons: with --linearity or --follow
+  --sweep[=LIST] also what becomes of the costs with the number of files; of
+                 the parts interleaved, row and rest only those in LIST
+  --files=LIST   the numbers of files there, instead of a few for each part
+  --live[=F,R,S,M] also kelvo -f on F files that get R records a second each, for
+                 S seconds, and hold those of M milliseconds (default
+                 300,3000,5,1000; numbers at the end may be left out)
+  --none         none of the comparisons: with one of these options
   --quick        a hundredth of the records, one run each, follows for 2 seconds
   --kelvo=FILE   measure this program (default: the one built beside)
   --temp=DIR     where inputs are made (default $TMPDIR or /tmp); they need up
                  to 0.4 GB at a time, 1.4 GB with --linearity
 )";
 
-struct settings {
+struct settings : run_settings {
     uint64_t uRecords = 5'000'000;
-    unsigned uRepeat = 5;
     std::string only;
-    output_target target = output_target::NULL_DEVICE;
     std::string sTarget = "/dev/null";
     bool bComparisons = true;
     bool bLinearity = false;
     bool bFollow = false;
+    bool bSweep = false;
+    bool bLive = false;
     bool bQuick = false;
     unsigned uFollowSeconds = 30;
-    std::string kelvo = KELVO_PROGRAM;
-    std::string temp;
+    sweep_settings sweep;
+    live_load live;
 };
 
 /// An input of the comparison.
@@ -78,8 +87,7 @@ uint64_t make_input(const input& in, uint64_t uRecords, const std::string& sDire
     const uint64_t uPerFile = std::max<uint64_t>(uRecords / in.uFiles, 1);
     const std::string sTimes = in.bSequential ? "sequential" : "interleave";
     if (std::string_view(in.pProfile) == "values")
-        run_quietly({MAKE_VALUES_PROGRAM, sDirectory, std::to_string(in.uFiles),
-                     std::to_string(uPerFile), sTimes});
+        make_values(sDirectory, in.uFiles, uPerFile, sTimes);
     else
         run_quietly({SAMPLE_PROGRAM, "--directory=" + sDirectory,
                      std::string("--profile=") + in.pProfile,
@@ -87,61 +95,6 @@ uint64_t make_input(const input& in, uint64_t uRecords, const std::string& sDire
                      "--records=" + std::to_string(uPerFile), "--times=" + sTimes});
     return uPerFile * in.uFiles;
 }
-
-/// kelvo (0) and the floor (1) as they are run.
-struct program_pair {
-    command_words words[2];
-
-    program_pair(const settings& options, const input& in, const std::string& sDirectory) {
-        words[0] = {options.kelvo, "-t", sDirectory};
-        words[1] = {FLOOR_PROGRAM};
-        if (in.bRaw) {
-            words[0].push_back("-r");
-            words[1].push_back("-r");
-        }
-        std::vector<std::string> traces;
-        for (const auto& entry : std::filesystem::directory_iterator(sDirectory))
-            if (entry.path().extension() == ".trc")
-                traces.push_back(entry.path());
-        std::sort(traces.begin(), traces.end());
-        for (command_words& program : words)
-            program.insert(program.end(), traces.begin(), traces.end());
-    }
-};
-
-double median(std::vector<double> values) {
-    std::sort(values.begin(), values.end());
-    const size_t uHalf = values.size() / 2;
-    return values.size() % 2 != 0 ? values[uHalf] : (values[uHalf - 1] + values[uHalf]) / 2;
-}
-
-/// Median of a figure of one program.
-double median_of(const std::vector<run_cost>& runs, double run_cost::*pFigure) {
-    std::vector<double> values;
-    for (const run_cost& run : runs)
-        values.push_back(run.*pFigure);
-    return median(values);
-}
-
-/// Median of the ratios of runs that followed each other: on a busy machine
-/// they suffer alike.
-double median_ratio(const std::vector<run_cost> (&runs)[2], double run_cost::*pFigure) {
-    std::vector<double> ratios;
-    for (size_t i = 0; i < runs[0].size(); ++i)
-        ratios.push_back(runs[0][i].*pFigure / std::max(runs[1][i].*pFigure, 1e-6));
-    return median(ratios);
-}
-
-/// Runs of each of the two, in turn.
-void run_in_turn(const settings& options, const program_pair& programs,
-                 const std::string& sDirectory, std::vector<run_cost> (&runs)[2]) {
-    for (unsigned u = 0; u < options.uRepeat; ++u)
-        for (size_t i = 0; i < 2; ++i)
-            runs[i].push_back(
-                run_measured(programs.words[i], options.target, sDirectory + "/output.txt"));
-}
-
-constexpr double MIB = 1024.0 * 1024;
 
 void print_heading(const settings& options) {
     printf("Output to %s, medians of %u run%s, programs in turn.\n\n", options.sTarget.c_str(),
@@ -155,21 +108,20 @@ void print_heading(const settings& options) {
 void compare(const settings& options, const input& in) {
     const temp_directory directory(options.temp);
     const uint64_t uRecords = make_input(in, options.uRecords / in.uShare, directory.path());
-    const program_pair programs(options, in, directory.path());
+    const program_pair programs(options.kelvo, directory.path(), in.bRaw);
     const comparison same = compare_outputs(programs.words[0], programs.words[1]);
 
-    std::vector<run_cost> runs[2];
-    run_in_turn(options, programs, directory.path(), runs);
+    const paired_runs runs(options, programs, directory.path());
     const auto millions = static_cast<double>(uRecords) / 1e6;
     for (size_t i = 0; i < 2; ++i) {
-        const double wall = median_of(runs[i], &run_cost::wall);
+        const double wall = runs.median(i, &run_cost::wall);
         printf("%-24s %-6s %8.3f %8.3f %8.3f %9.3f %9.1f %9.1f", i == 0 ? in.pName : "",
-               i == 0 ? "kelvo" : "floor", millions, wall, median_of(runs[i], &run_cost::cpu),
-               millions / wall, median_of(runs[i], &run_cost::maxResident) / MIB,
+               i == 0 ? "kelvo" : "floor", millions, wall, runs.median(i, &run_cost::cpu),
+               millions / wall, runs.median(i, &run_cost::maxResident) / MIB,
                static_cast<double>(same.uPrivate[i]) / MIB);
         if (i == 0)
-            printf(" %7.2f %7.2f", median_ratio(runs, &run_cost::wall),
-                   median_ratio(runs, &run_cost::cpu));
+            printf(" %7.2f %7.2f", runs.median_ratio(&run_cost::wall),
+                   runs.median_ratio(&run_cost::cpu));
         printf("\n");
     }
     fflush(stdout);
@@ -184,16 +136,14 @@ void measure_linearity(const settings& options) {
         const temp_directory directory(options.temp);
         const uint64_t uRecords =
             make_input(INPUTS[0], uThousands * (options.bQuick ? 10 : 1000), directory.path());
-        const program_pair programs(options, INPUTS[0], directory.path());
-        std::vector<run_cost> runs[2];
-        run_in_turn(options, programs, directory.path(), runs);
-        const double wall = median_of(runs[0], &run_cost::wall);
-        const double cpu = median_of(runs[0], &run_cost::cpu);
+        const program_pair programs(options.kelvo, directory.path());
+        const paired_runs runs(options, programs, directory.path());
+        const double wall = runs.median(0, &run_cost::wall);
+        const double cpu = runs.median(0, &run_cost::cpu);
         const auto records = static_cast<double>(uRecords);
         printf("%8.3f %8.3f %8.3f %11.1f %10.1f %9.1f %9.2f\n", records / 1e6, wall, cpu,
                wall * 1e9 / records, cpu * 1e9 / records,
-               median_of(runs[0], &run_cost::maxResident) / MIB,
-               median_ratio(runs, &run_cost::cpu));
+               runs.median(0, &run_cost::maxResident) / MIB, runs.median_ratio(&run_cost::cpu));
         fflush(stdout);
     }
 }
@@ -206,6 +156,24 @@ bool read_target(std::string_view text, settings* pOptions) {
                                         : output_target::NULL_DEVICE;
     pOptions->sTarget = text == "pipe" ? "a pipe" : text == "file" ? "a file" : "/dev/null";
     return text == "pipe" || text == "file" || text == "null";
+}
+
+std::vector<unsigned> numbers_of(const std::string& sList) {
+    std::vector<unsigned> numbers;
+    std::istringstream list(sList);
+    for (std::string sNumber; std::getline(list, sNumber, ',');)
+        numbers.push_back(static_cast<unsigned>(strtoul(sNumber.c_str(), nullptr, 10)));
+    return numbers;
+}
+
+bool read_load(const std::string& sValue, live_load* pLoad) {
+    const std::vector<unsigned> numbers = numbers_of(sValue);
+    unsigned* const fields[] = {&pLoad->uFiles, &pLoad->uRate, &pLoad->uSeconds, &pLoad->uRoomMs};
+    if (numbers.size() > std::size(fields) || std::ranges::count(numbers, 0U) != 0)
+        return false;
+    for (size_t i = 0; i < numbers.size(); ++i)
+        *fields[i] = numbers[i];
+    return true;
 }
 
 bool read_option(char letter, const std::string& sValue, settings* pOptions) {
@@ -229,6 +197,14 @@ bool read_option(char letter, const std::string& sValue, settings* pOptions) {
         return pOptions->bFollow = pOptions->uFollowSeconds != 0;
     case 'a':
         return pOptions->bLinearity = pOptions->bFollow = true;
+    case 's':
+        pOptions->sweep.parts = sValue;
+        return pOptions->bSweep = sweep_parts_exist(sValue);
+    case 'i':
+        pOptions->sweep.files = numbers_of(sValue);
+        return std::ranges::count(pOptions->sweep.files, 0U) == 0;
+    case 'v':
+        return pOptions->bLive = read_load(sValue, &pOptions->live);
     case '0':
         pOptions->bComparisons = false;
         return true;
@@ -236,6 +212,8 @@ bool read_option(char letter, const std::string& sValue, settings* pOptions) {
         pOptions->uRecords = 50'000;
         pOptions->uRepeat = 1;
         pOptions->uFollowSeconds = 2;
+        pOptions->sweep.uRestSeconds = 1;
+        pOptions->live.uSeconds = 1;
         return pOptions->bQuick = true;
     case 'k':
         pOptions->kelvo = sValue;
@@ -250,21 +228,17 @@ bool read_option(char letter, const std::string& sValue, settings* pOptions) {
 
 settings read_options(int argc, char** argv) {
     static constexpr option OPTIONS[] = {
-        {"records", required_argument, nullptr, 'n'},
-        {"repeat", required_argument, nullptr, 'c'},
-        {"only", required_argument, nullptr, 'w'},
-        {"output", required_argument, nullptr, 'o'},
-        {"linearity", no_argument, nullptr, 'l'},
-        {"follow", optional_argument, nullptr, 'f'},
-        {"all", no_argument, nullptr, 'a'},
-        {"none", no_argument, nullptr, '0'},
-        {"quick", no_argument, nullptr, 'q'},
-        {"kelvo", required_argument, nullptr, 'k'},
-        {"temp", required_argument, nullptr, 't'},
-        {"help", no_argument, nullptr, 'h'},
-        {nullptr, 0, nullptr, 0},
+        {"records", required_argument, nullptr, 'n'}, {"repeat", required_argument, nullptr, 'c'},
+        {"only", required_argument, nullptr, 'w'},    {"output", required_argument, nullptr, 'o'},
+        {"linearity", no_argument, nullptr, 'l'},     {"follow", optional_argument, nullptr, 'f'},
+        {"sweep", optional_argument, nullptr, 's'},   {"files", required_argument, nullptr, 'i'},
+        {"live", optional_argument, nullptr, 'v'},    {"all", no_argument, nullptr, 'a'},
+        {"none", no_argument, nullptr, '0'},          {"quick", no_argument, nullptr, 'q'},
+        {"kelvo", required_argument, nullptr, 'k'},   {"temp", required_argument, nullptr, 't'},
+        {"help", no_argument, nullptr, 'h'},          {nullptr, 0, nullptr, 0},
     };
     settings options;
+    options.kelvo = KELVO_PROGRAM;
     options.temp = temp_parent();
     for (int code; (code = getopt_long(argc, argv, "", OPTIONS, nullptr)) != -1;) {
         const bool bGood =
@@ -279,8 +253,9 @@ settings read_options(int argc, char** argv) {
     return options;
 }
 
-void run_benchmarks(int argc, char** argv) {
-    const settings options = read_options(argc, argv);
+/// False when a run of the sweep failed.
+bool run_benchmarks(int argc, char** argv) {
+    settings options = read_options(argc, argv);
     setenv("LC_ALL", "C", 1); // the floor writes times as this locale does
     if (options.bComparisons) {
         print_heading(options);
@@ -294,14 +269,19 @@ void run_benchmarks(int argc, char** argv) {
         const temp_directory directory(options.temp);
         measure_follow(options.kelvo, directory.path(), options.uFollowSeconds);
     }
+    if (options.bLive) {
+        const temp_directory directory(options.temp);
+        measure_live_load(options.kelvo, directory.path(), options.target, options.live);
+    }
+    options.sweep.uRecords = options.uRecords / 5;
+    return !options.bSweep || measure_sweep(options, options.sweep);
 }
 
 } // namespace
 
 int main(int argc, char** argv) {
     try {
-        run_benchmarks(argc, argv);
-        return 0;
+        return run_benchmarks(argc, argv) ? 0 : 1;
     } catch (const std::exception& failure) {
         fflush(stdout);
         fprintf(stderr, "kelvo_throughput: %s\n", failure.what());

@@ -59,8 +59,6 @@ TEST_F(Corruption, IsNamedAndEndsItsFileOnly) {
          sCorrupt + "invalid record function type: " + sFile +
              "record_offset(0x00000110) function(18)",
          2},
-        {THIRD + 12, raw_bytes("A\tB\x7f"), sCorrupt + "invalid record compId: " + sFile, 2},
-        {THIRD, raw_bytes(27U), sCorrupt + "invalid record length: " + sFile, 2},
         {THIRD, raw_bytes(0xFFFFFFE4U), sOutside, 3},
         {offsetof(trace_file_header, uOldestRecordOffset), raw_bytes(4096U - 27), sOutside, 0},
         {LAST, raw_bytes(36U + 8),

@@ -6,6 +6,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <fcntl.h>
+#include <fstream>
 #include <poll.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
@@ -209,6 +210,14 @@ command_result run_command(const std::vector<std::string>& arguments, const comm
 uint64_t setting(const char* pName, uint64_t uDefault) {
     const char* const pValue = getenv(pName);
     return pValue != nullptr && *pValue != '\0' ? strtoull(pValue, nullptr, 10) : uDefault;
+}
+
+std::string status_of(pid_t pid, const std::string& sName) {
+    std::ifstream status("/proc/" + std::to_string(pid) + "/status");
+    for (std::string sLine; std::getline(status, sLine);)
+        if (sLine.starts_with(sName + ':'))
+            return sLine.substr(sName.size() + 1);
+    return "";
 }
 
 bool is_locked(const std::string& sPath) {

@@ -88,6 +88,9 @@ command_result run_command(const std::vector<std::string>& arguments,
 /// A number from the environment, for runs longer than the usual ones.
 uint64_t setting(const char* pName, uint64_t uDefault);
 
+/// What /proc says of a process under a name such as "Threads"; "" when it has ended.
+std::string status_of(pid_t pid, const std::string& sName);
+
 /// Whether another process holds a lock on the file.
 bool is_locked(const std::string& sPath);
 

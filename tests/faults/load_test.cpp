@@ -1,10 +1,15 @@
 // Runs at the limits: many files, files as large as they can be, and the memory
 // that a full output queue takes.
 #include "faults_support.h"
+#include "sample_trace.h"
 
+#include <algorithm>
+#include <csignal>
+#include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <gmock/gmock.h>
@@ -39,6 +44,98 @@ TEST(Load, ManyFilesNeedFewDescriptors) {
     EXPECT_EQ(count_of("\n[", result.sOut) + 1, uFiles + (uFiles - uBroken) * RECORDS);
     EXPECT_EQ(count_of("2625-105", result.sErr) + count_of("2625-107", result.sErr), uBroken);
     EXPECT_EQ(count_of("2625-102", result.sErr), 0U) << result.sErr.substr(0, 1000);
+}
+
+/// All at the same time, merged and followed, where few descriptors are allowed at
+/// first.
+TEST(Load, ManyFilesAtOnceNeedFewThreads) {
+    constexpr uint64_t RECORDS = 40;
+    const uint64_t uFiles = SANITIZED ? 200 : 1024;
+    rlimit descriptors{};
+    getrlimit(RLIMIT_NOFILE, &descriptors);
+    if (descriptors.rlim_max < uFiles + 100)
+        GTEST_SKIP() << "no " << uFiles << " files may be open here";
+    const temp_dir dir;
+    const std::vector<sample_record> records(RECORDS, sample_uint32(1, 1, 0));
+    std::vector<std::string> files{dir.file("0")};
+    ASSERT_EQ(write_sample_trace(files[0], records, {.uFileSize = 4096}), TRACE_WRITER_OK);
+    while (files.size() < uFiles) {
+        files.push_back(dir.file(std::to_string(files.size())));
+        std::filesystem::copy_file(files[0], files.back());
+    }
+    command_setup setup;
+    setup.sProgram = "/bin/sh";
+    for (const bool bFollow : {false, true}) {
+        std::vector<std::string> arguments{
+            "-c", "ulimit -Sn 100 && exec \"$0\" \"$@\"", KELVO_PROGRAM, "-r", "-o", "", "-s",
+            "+0r"};
+        if (bFollow)
+            arguments.push_back("-f");
+        arguments.insert(arguments.end(), files.begin(), files.end());
+        live_command kelvo(arguments, setup);
+        uint64_t uValues = 0; // two in each record
+        long iThreads = 0, iKiB = 0;
+        for (std::string sText; uValues < 2 * uFiles * RECORDS;) {
+            sText = kelvo.read_text();
+            if (sText.empty())
+                break;
+            uValues += static_cast<uint64_t>(std::ranges::count(sText, '='));
+            iThreads = std::max(iThreads, atol(status_of(kelvo.pid(), "Threads").c_str()));
+            iKiB = std::max(iKiB, atol(status_of(kelvo.pid(), "RssAnon").c_str()));
+        }
+        if (bFollow)
+            kelvo.send_signal(SIGINT);
+        const command_result result = kelvo.wait();
+        expect_sound_end(result);
+        ASSERT_EQ(result.sErr.substr(0, 1000), "");
+        EXPECT_EQ(uValues, 2 * uFiles * RECORDS);
+        EXPECT_LE(iThreads, 64);
+        EXPECT_TRUE(SANITIZED || iKiB < 100 * 1024) << iKiB;
+    }
+}
+
+/// A reader gets through its file though nothing of it is printed, since the output
+/// is not read: what a live writer needs of it must not depend on other files.
+TEST(Load, NoFileHoldsUpTheReaderOfAnother) {
+    constexpr uint32_t RECORDS = 30'000;
+    const temp_dir dir;
+    const std::string sLong = dir.file("long");
+    for (const bool bNewBases : {false, true}) {
+        trace_writer writer;
+        ASSERT_EQ(writer.create(sLong.c_str(), {.uFileSize = 64 * RECORDS}), TRACE_WRITER_OK);
+        for (uint64_t i = 0; i < RECORDS; ++i) {
+            const trace_origin origin{"_TST", 1, i};
+            if (bNewBases && i % 100 == 30)
+                writer.append_start(origin, 1, 2, {0, 0});
+            else if (bNewBases && i % 100 == 60)
+                writer.append_time_calibration(origin, {0, 0});
+            else
+                writer.append_uint32(origin, 1, 0);
+        }
+        const uint32_t uEnd = writer.next_seq_number();
+        writer.close();
+        ASSERT_EQ(uEnd, 2 * RECORDS + 2);
+        for (const uint32_t uFiles : {8U, 64U})
+            for (const char* const pMode : {"-r", "-rf"}) {
+                std::vector<std::string> arguments{pMode, "-s", "+0r", sLong};
+                while (arguments.size() < 3 + uFiles) {
+                    const uint64_t uTime = arguments.size() * RECORDS / (3 + uFiles);
+                    arguments.push_back(dir.file(std::to_string(arguments.size())));
+                    ASSERT_EQ(write_sample_trace(arguments.back(), {sample_uint32(uTime, 1, 0)},
+                                                 {.uFileSize = 4096}),
+                              TRACE_WRITER_OK);
+                }
+                const live_command kelvo(arguments);
+                uint32_t uSeqLock = 0;
+                const int fd = open(sLong.c_str(), O_RDONLY | O_CLOEXEC);
+                for (int i = 0; i < 20'000 && uSeqLock != uEnd; ++i) {
+                    usleep(1000);
+                    pread(fd, &uSeqLock, sizeof uSeqLock, offsetof(trace_file_header, uSeqLock));
+                }
+                close(fd);
+                ASSERT_EQ(uSeqLock, uEnd) << uFiles << " files, " << pMode << ", " << bNewBases;
+            }
+    }
 }
 
 // ---------------------------------------------------------------- large files
@@ -91,14 +188,11 @@ INSTANTIATE_TEST_SUITE_P(Of, LargeFile, testing::Values(0x80000000U, 0xFFFFFFFCU
 
 /// Waits until the process takes no more memory.
 void wait_until_full(pid_t pid) {
-    const std::string sPath = "/proc/" + std::to_string(pid) + "/statm";
-    uint64_t uLast = 0;
+    std::string sLast;
     for (int iSame = 0; iSame < 5; usleep(50'000)) {
-        uint64_t uTotal = 0;
-        uint64_t uResident = 0;
-        std::ifstream(sPath) >> uTotal >> uResident;
-        iSame = uResident == uLast ? iSame + 1 : 0;
-        uLast = uResident;
+        const std::string sResident = status_of(pid, "VmRSS");
+        iSame = sResident == sLast ? iSame + 1 : 0;
+        sLast = sResident;
     }
 }
 

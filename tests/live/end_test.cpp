@@ -6,7 +6,6 @@
 
 #include <csignal>
 #include <cstring>
-#include <fstream>
 #include <random>
 #include <unistd.h>
 
@@ -49,11 +48,8 @@ protected:
 void wait_until_armed(pid_t pid) {
     const uint64_t uWanted = uint64_t{1} << (SIGPIPE - 1) | uint64_t{1} << (SIGTTOU - 1);
     for (int i = 0; i < 60'000; ++i) {
-        std::ifstream status("/proc/" + std::to_string(pid) + "/status");
-        for (std::string sLine; std::getline(status, sLine);)
-            if (sLine.starts_with("SigCgt:") &&
-                (strtoull(sLine.c_str() + 7, nullptr, 16) & uWanted) == uWanted)
-                return;
+        if ((strtoull(status_of(pid, "SigCgt").c_str(), nullptr, 16) & uWanted) == uWanted)
+            return;
         usleep(1000);
     }
     ADD_FAILURE() << "no handlers";

@@ -29,10 +29,17 @@ protected:
         return result;
     }
 
+    /// Waits for room where a reader has left none.
     static void append(trace_writer& writer, const std::string& sText) {
         const uint64_t uNow = static_cast<uint64_t>(
             std::chrono::nanoseconds(std::chrono::system_clock::now().time_since_epoch()).count());
-        ASSERT_EQ(writer.append_string({"_TST", 1, uNow}, sText), TRACE_WRITER_OK);
+        trace_writer_status status = TRACE_WRITER_DROPPED;
+        for (int i = 0; i < 100'000 && status == TRACE_WRITER_DROPPED; ++i) {
+            status = writer.append_string({"_TST", 1, uNow}, sText);
+            if (status == TRACE_WRITER_DROPPED)
+                usleep(100);
+        }
+        ASSERT_EQ(status, TRACE_WRITER_OK);
     }
 
     /// Makes the first file with records n1, n2 and so on.
@@ -126,6 +133,65 @@ TEST_F(Follow, BeginsWithTheLastRecordUnlessAStartIsGiven) {
         EXPECT_EQ(sRecords, sExpected);
         EXPECT_EQ(interrupt(kelvo).sErr, ""); // no progress line either
     }
+}
+
+// ------------------------------------------------------- others at the file
+
+TEST_F(Follow, AFileNamedAgainHasOneReader) {
+    constexpr int RECORDS = 3000;
+    make(2);
+    const std::string sLink = m_dir.file("link"), sOther = m_dir.file("other"),
+                      sSpelling = m_dir.path() + "/./first.trc";
+    ASSERT_EQ(link(m_sFirst.c_str(), sOther.c_str()), 0);
+    ASSERT_EQ(symlink(m_sFirst.c_str(), sLink.c_str()), 0);
+    live_command kelvo({"-f", "-s", "+0r", "-o", "", m_sFirst, m_sFirst, sSpelling, sLink, sOther});
+    for (const std::string& sName : {m_sFirst, sSpelling, sLink, sOther})
+        EXPECT_EQ(kelvo.read_line_with("2625-"),
+                  KELVO_PROGRAM ": 2625-161 Trace file \"" + sName + "\" is already in use.");
+    wait_for_reader(m_first);
+    for (int i = 3; i <= RECORDS; ++i)
+        append(m_first, "n" + std::to_string(i));
+    for (int i = 1; i <= RECORDS; ++i)
+        ASSERT_TRUE(kelvo.read_line_with("  n").ends_with("  n" + std::to_string(i))) << i;
+    EXPECT_EQ(interrupt(kelvo).sOut, "");
+}
+
+/// While it lasts, another run without a lock takes the reader's words for its own.
+/// The file is written round and round only when it is over.
+TEST_F(Follow, ARunWithoutALockBesideItDoesNoHarm) {
+    constexpr int RECORDS = 30'000, ROOM = 4000;
+    ASSERT_EQ(m_first.create(m_sFirst.c_str(), {.uFileSize = 40 * ROOM}), TRACE_WRITER_OK);
+    append(m_first, "n1");
+    live_command kelvo({"-f", "-s", "+0r", "-o", "", m_sFirst});
+    wait_for_reader(m_first);
+    int iLast = 1;
+    std::jthread writing([&](const std::stop_token& ends) {
+        while (!ends.stop_requested()) {
+            usleep(200);
+            if (iLast < ROOM / 2)
+                append(m_first, "n" + std::to_string(++iLast));
+            m_first.poll();
+        }
+    });
+    for (int i = 0; i < 3; ++i) {
+        const command_result other = run_command({"-z", "-o", "", m_sFirst});
+        EXPECT_EQ(other.status, 0);
+        EXPECT_THAT(other.sOut, HasSubstr("\n  n1\n"));
+    }
+    writing.request_stop();
+    writing.join();
+    const auto& header = *reinterpret_cast<const trace_file_header*>(m_first.mapping().data());
+    const auto seq_lock = [&] { return __atomic_load_n(&header.uSeqLock, __ATOMIC_ACQUIRE); };
+    for (int i = 0; i < 10'000 && seq_lock() != m_first.next_seq_number(); ++i)
+        usleep(1000);
+    ASSERT_EQ(seq_lock(), m_first.next_seq_number()) << "the reader's word was not put right";
+    writing = std::jthread([&] {
+        while (iLast < RECORDS && !HasFailure())
+            append(m_first, "n" + std::to_string(++iLast));
+    });
+    for (int i = 1; i <= RECORDS; ++i)
+        ASSERT_TRUE(kelvo.read_line_with("  n").ends_with("  n" + std::to_string(i))) << i;
+    EXPECT_EQ(interrupt(kelvo).sErr, "");
 }
 
 // -------------------------------------------------------------------- damage
