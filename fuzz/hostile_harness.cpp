@@ -2,6 +2,7 @@
 
 #include "accept.h"
 #include "first_record.h"
+#include "reader_words.h"
 #include "record.h"
 #include "record_batch.h"
 #include "record_copy.h"

@@ -318,13 +318,13 @@ TEST_F(Open, of_twins_shares_one_lock_and_keeps_the_words_of_the_slowest) {
     trace_file* const pLast = twins[2].pFile;
     for (const opened& twin : twins) {
         ASSERT_EQ(open_lock_map_trace_file(twin.pFile), 0);
-        raise_tail_request(twin.pFile);
+        request_tail(twin.pFile);
         ASSERT_EQ(find_first_record(twin.pFile), 0);
     }
     EXPECT_EQ(count_descriptors(), uClosed + 1);
     const trace_file_header& header = *pFirst->pHeader;
-    lower_tail_request(pFirst);
-    lower_tail_request(pLast);
+    release_tail(pFirst);
+    release_tail(pLast);
     EXPECT_EQ(header.uTailReq, TRC_TAIL_REQUESTED);
     close_trace_file(twins[1].pFile); // it never reads
     EXPECT_EQ(header.uTailReq, 0U);
@@ -394,7 +394,7 @@ TEST_F(Open, stores_nothing_in_a_file_that_is_only_read) {
     ASSERT_EQ(open_checked_file(path.c_str(), true, &pFile, &header).eOutcome, OPEN_OK);
     ASSERT_EQ(accept_trace_file(pFile.get(), header, &elem).eOutcome, OPEN_OK);
     EXPECT_FALSE(is_locked());
-    raise_tail_request(pFile.get());
+    request_tail(pFile.get());
     EXPECT_EQ(find_first_record(pFile.get()), 0);
     EXPECT_EQ(read_all(pFile.get()), 1);
     pFile->pHeader->uSeqLock = 4711; // whoever stores all the same

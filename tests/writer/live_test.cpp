@@ -2,6 +2,7 @@
 // reader that dies; and the whole of it with reader and writer on two threads.
 #include "first_record.h"
 #include "raw_trace.h"
+#include "reader_words.h"
 #include "reference_reader.h"
 #include "ring.h"
 #include "shared_words.h"

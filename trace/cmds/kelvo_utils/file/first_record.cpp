@@ -73,18 +73,6 @@ cu_timeinfo time_base(const trace_file* pTraceFile, uint64_t uOffset,
 
 } // namespace
 
-void request_tail(trace_file* pTraceFile) {
-    raise_tail_request(pTraceFile);
-}
-
-bool tail_is_kept(const trace_file* pTraceFile) {
-    return pTraceFile->bReadOnly || tail_request_is_acknowledged(pTraceFile->pHeader);
-}
-
-void release_tail(trace_file* pTraceFile) {
-    lower_tail_request(pTraceFile);
-}
-
 int find_first_record(trace_file* pTraceFile) {
     ring_search search{pTraceFile, load_oldest_record_offset(pTraceFile->pHeader)};
     pTraceFile->pCurRec = ring_position(pTraceFile, search.uOffset);

@@ -1,21 +1,8 @@
-// The reader's handshake with the writer and the search for the oldest record.
-//
-// While uTailReq is raised the writer leaves the oldest record where it is, so
-// that the reader can take its place there. The reader waits for the writer's
-// acknowledgement only for a short time: a file whose writer has ended is read
-// without one.
+// The search for the oldest record. It is made between request_tail and release_tail
+// (reader_words.h), so that the record stays where it is.
 #pragma once
 
 #include "kelvo.h"
-
-/// Raises uTailReq: asks the writer to leave the oldest record where it is.
-void request_tail(trace_file* pTraceFile);
-
-/// Whether the writer has acknowledged it.
-bool tail_is_kept(const trace_file* pTraceFile);
-
-/// Lowers uTailReq: the writer may give up old records again.
-void release_tail(trace_file* pTraceFile);
 
 /// Places pCurRec on the oldest record, past fillers and unfinished records,
 /// keeping uExpectedSeq, uSeqLock, modTime and timeStampIsValid. Works over plain

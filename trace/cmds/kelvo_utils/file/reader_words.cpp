@@ -18,7 +18,7 @@ void tell_place_now(trace_file* pTraceFile) {
         store_seq_lock(pTraceFile->pHeader, pTraceFile->uExpectedSeq);
 }
 
-void raise_tail_request(trace_file* pTraceFile) {
+void request_tail(trace_file* pTraceFile) {
     if (pTraceFile->bReadOnly)
         return;
     if (pTraceFile->pTwins != nullptr)
@@ -27,7 +27,11 @@ void raise_tail_request(trace_file* pTraceFile) {
         store_tail_request(pTraceFile->pHeader, TRC_TAIL_REQUESTED);
 }
 
-void lower_tail_request(trace_file* pTraceFile) {
+bool tail_is_kept(const trace_file* pTraceFile) {
+    return pTraceFile->bReadOnly || tail_request_is_acknowledged(pTraceFile->pHeader);
+}
+
+void release_tail(trace_file* pTraceFile) {
     if (pTraceFile->bReadOnly)
         return;
     if (pTraceFile->pTwins != nullptr)

@@ -25,6 +25,17 @@ inline void tell_place(trace_file* pTraceFile) {
 /// The same at once, for twins too: when the reader is going to rest.
 void tell_place_now(trace_file* pTraceFile);
 
-/// Before the search for the first record, and behind it.
-void raise_tail_request(trace_file* pTraceFile);
-void lower_tail_request(trace_file* pTraceFile);
+// The reader's handshake with the writer. While uTailReq is raised the writer leaves
+// the oldest record where it is, so that the reader can take its place there. The
+// reader waits for the writer's acknowledgement only for a short time: a file whose
+// writer has ended is read without one.
+
+/// Raises uTailReq: asks the writer to leave the oldest record where it is.
+void request_tail(trace_file* pTraceFile);
+
+/// Whether the writer has acknowledged it. Of a file that is only read always true:
+/// there is nothing to wait for.
+bool tail_is_kept(const trace_file* pTraceFile);
+
+/// Lowers uTailReq: the writer may give up old records again.
+void release_tail(trace_file* pTraceFile);
