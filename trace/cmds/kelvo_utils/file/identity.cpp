@@ -1,8 +1,8 @@
 #include "identity.h"
 
-#include <cstdlib>
 #include <fcntl.h>
 #include <iterator>
+#include <new>
 #include <sys/stat.h>
 
 namespace {
@@ -43,14 +43,14 @@ void put_in_chain(trace_file* pTraceFile) {
 
 void free_table() {
     if (ppChains != firstChains)
-        free(ppChains);
+        delete[] ppChains;
     ppChains = firstChains;
     uChains = std::size(firstChains);
 }
 
 void grow_table() {
     const size_t uLarger = 4 * uChains;
-    auto** const ppLarger = static_cast<trace_file**>(calloc(uLarger, sizeof(trace_file*)));
+    auto** const ppLarger = new (std::nothrow) trace_file*[uLarger]();
     if (ppLarger == nullptr)
         return;
     trace_file** const ppOld = ppChains;
@@ -63,7 +63,7 @@ void grow_table() {
             put_in_chain(pTraceFile);
         }
     if (ppOld != firstChains)
-        free(ppOld);
+        delete[] ppOld;
 }
 
 } // namespace
