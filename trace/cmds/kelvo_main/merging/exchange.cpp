@@ -17,6 +17,7 @@ TrcFmtngProcCtrl& ctrl = Glbl_TrcFmtngProcCtrl;
 constexpr uint32_t FLOORS_TOGETHER = 131'072;
 constexpr uint64_t FLOOR_BYTES_TOGETHER = 64ULL << 20;
 constexpr uint32_t MOST_FLOOR = 1024;
+constexpr uint32_t CHEAP_FLOOR = 64; // of short records
 constexpr uint32_t LEAST_FLOOR = 5;
 
 /// From here on large records count: each file has one queued, which the merge rule
@@ -28,7 +29,8 @@ constexpr uint64_t SCARCE_BYTES = 320ULL << 20;
 constexpr int64_t FULL_QUEUE_WAIT_NS = 500'000;
 
 /// A pool thread is woken for so many files' part of the readers at a time.
-constexpr uint32_t FILES_PER_WAKING = 16;
+constexpr uint32_t FILES_PER_WAKING = 16; // of those that run
+constexpr uint32_t MOST_FILES_PER_WAKING = 64;
 
 // Under priorityQmutex:
 uint32_t uRunningFiles = 0;
@@ -50,7 +52,7 @@ uint32_t floor_of(const merge_file& file) {
         return 1;
     if (file.account.uBytes >= FLOOR_BYTES_TOGETHER / uRunningFiles)
         return LEAST_FLOOR;
-    return std::clamp(FLOORS_TOGETHER / uRunningFiles, LEAST_FLOOR, MOST_FLOOR);
+    return std::clamp(FLOORS_TOGETHER / uRunningFiles, CHEAP_FLOOR, MOST_FLOOR);
 }
 
 void hold_back(merge_file& file) {
@@ -228,5 +230,6 @@ void exchange_with_readers(uint32_t uTaken) {
     release_batches(finished);
     resumed.carry_out();
     // Who has taken something has more, mostly, and the readers may come in company.
-    poolWakeThread(uTaken == 0 ? 1 : uRunning / FILES_PER_WAKING + 1);
+    poolWakeThread(uTaken == 0 ? 1
+                               : std::min(uRunning / FILES_PER_WAKING + 1, MOST_FILES_PER_WAKING));
 }
