@@ -22,6 +22,9 @@ inline constexpr uint64_t MAX_QUEUED_BYTES = 256ULL << 20;
 /// Most records that a reader reads before it asks again.
 inline constexpr uint32_t MAX_BATCH = 128;
 
+/// It asks sooner when those take so much memory: large records fill the queue too.
+inline constexpr uint64_t MAX_BATCH_BYTES = 256ULL << 10;
+
 /// Pushes batches of the file, each after the readers of those files were started
 /// whose time it brings. Any thread.
 void push_batches(merge_file& file, batch_list batches);

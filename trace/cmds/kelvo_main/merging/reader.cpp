@@ -135,7 +135,7 @@ task_wish reader_step::read() {
         here = step_and_judge(m_pTraceFile, &m_state.header);
         if (here != WALK_RECORD)
             break;
-        if (m_records.count() >= m_uRoom) {
+        if (m_records.count() >= m_uRoom || m_records.bytes() >= MAX_BATCH_BYTES) {
             m_uRoom = push_and_ask(m_file, m_records.take_over());
             if (m_uRoom == 0) {
                 tell_place_now(m_pTraceFile);

@@ -215,6 +215,7 @@ bool batch_writer::add(const trace_record_header& header, cu_timeinfo* pBase) {
     ++m_pOpen->uCount;
     ++m_pOpen->uLeft;
     ++m_uCount;
+    m_uBytes += pElement->length;
     if (trc_kind_changes_time_base(header.function)) [[unlikely]] {
         *pBase = brought_time_base(pElement);
         if (bOwnBase)
@@ -231,6 +232,7 @@ batch_list batch_writer::take_over() {
     m_batches = {};
     m_pOpen = nullptr;
     m_uCount = 0;
+    m_uBytes = 0;
     return batches;
 }
 

@@ -90,6 +90,11 @@ public:
         return m_uCount;
     }
 
+    /// Memory that they take.
+    uint64_t bytes() const {
+        return m_uBytes;
+    }
+
     /// The batches so far, now the caller's.
     batch_list take_over();
 
@@ -106,6 +111,7 @@ private:
     element_block* m_pBlock = nullptr;
     std::byte* m_pFree = nullptr; ///< the free part of m_pBlock
     uint32_t m_uCount = 0;
+    uint64_t m_uBytes = 0;
 };
 
 /// Releases batches, whatever is left in them. Any thread.
