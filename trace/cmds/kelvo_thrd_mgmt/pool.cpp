@@ -156,13 +156,19 @@ bool reserve_timed_task() {
     return true;
 }
 
-/// Sees to it that somebody takes the tasks that wait, or looks out for the
+/// Whether the lookout looks at `iMoment` at the latest.
+bool somebody_looks_by(int64_t iMoment) {
+    return iLookoutUntil != 0 && iLookoutUntil <= iMoment;
+}
+
+/// Sees to it that somebody takes the tasks that wait, soon, or looks out for the
 /// moments.
 void wake_thread_for_task() {
     const uint32_t uFree = totalFreeThrdsInPool;
-    const bool bNobodyLooks = iLookoutUntil == 0;
-    const bool bNeeded = a_task_waits() ? bNobodyLooks || totalThrdsInPool - uFree < uProcessors
-                                        : bNobodyLooks && uTimedTasks != 0;
+    bool bNeeded = uTimedTasks != 0 && !somebody_looks_by(pTimedTasks[0].iMoment);
+    if (a_task_waits())
+        bNeeded = totalThrdsInPool - uFree < uProcessors ||
+                  !somebody_looks_by(pool_now() + LOOKOUT_INTERVAL_NS);
     if (bNeeded && uFree != 0)
         pthread_cond_signal(&newsCond);
 }
@@ -380,7 +386,8 @@ void poolWakeThread(uint32_t uLeast) {
     if (uWaitingTasks == 0)
         return;
     const mutex_guard lock(thrd_pool_mutex);
-    if (!is_closed() && (uWaitingTasks >= uLeast || iLookoutUntil == 0))
+    if (!is_closed() &&
+        (uWaitingTasks >= uLeast || !somebody_looks_by(pool_now() + LOOKOUT_INTERVAL_NS)))
         wake_thread_for_task();
 }
 

@@ -138,6 +138,7 @@ task_wish reader_step::read() {
         if (m_records.count() >= m_uRoom || m_records.bytes() >= MAX_BATCH_BYTES) {
             m_uRoom = push_and_ask(m_file, m_records.take_over());
             if (m_uRoom == 0) {
+                m_state.phase = reader_phase::LOOKS; // much may happen meanwhile
                 tell_place_now(m_pTraceFile);
                 return SUSPEND;
             }
