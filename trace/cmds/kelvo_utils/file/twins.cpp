@@ -69,7 +69,10 @@ void set_asking(trace_twins* pTwins, trace_file* pTraceFile, bool bAsks) {
     if (bAsks == pTraceFile->bAsks)
         return;
     pTraceFile->bAsks = bAsks;
-    pTwins->uAsking += bAsks ? 1 : -1;
+    if (bAsks)
+        ++pTwins->uAsking;
+    else
+        --pTwins->uAsking;
     store_tail_request(pTraceFile->pHeader, pTwins->uAsking != 0 ? TRC_TAIL_REQUESTED : 0);
 }
 

@@ -19,7 +19,7 @@ namespace {
 /// What writing one format needs.
 struct format_run {
     const format_entry* pEntry;
-    const parm_list* pList; ///< for the values of '*'; may be null
+    const parm_list* pList; ///< for the values of '*'; null where the format has none
     int bAddr64;
     text_run& out; ///< not a part of this: setting up this one would clear its text
 
@@ -33,7 +33,7 @@ struct format_run {
         return pList && parmNum < pList->numParms;
     }
     int32_t star_value(uint8_t parmNum) const {
-        return load<int32_t>(pList->pParms[parmNum].bytes(), 0);
+        return pList ? load<int32_t>(pList->pParms[parmNum].bytes(), 0) : 0;
     }
     std::string_view text_of(const conv_spec& place) const {
         return {pEntry->pString + place.offset, place.lenConv};
